@@ -1,0 +1,64 @@
+// A time-zone data set: a release of the data, on the system partition or in the store.
+
+#ifndef KELVANE_DATASET_ORV_DATASET_H_
+#define KELVANE_DATASET_ORV_DATASET_H_
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "dataset/orv_dataset_component.h"
+#include "foundation/tz_version.h"
+
+namespace kelvane {
+
+// The directory of the downloaded data sets: each lies in a directory below, whose name is its
+// version text.
+inline constexpr char downloads_directory[] = "/var/db/timezone/tz/";
+
+// Whether `path` goes on after `downloads_directory`.
+bool is_below_downloads(const std::string& path);
+
+// A data set, named by its directory: the empty string for the system partition, otherwise
+// "/var/db/timezone/tz/" and the version text. Not changed once it is constructed.
+class orv_dataset {
+ public:
+  // The system partition's data set.
+  orv_dataset();
+
+  // The data set in `directory`. A version text that does not parse is warned about and counts as
+  // older than every version. Warns "orv_dataset::create_components: bad path DIRECTORY" and throws
+  // std::invalid_argument for any other directory; throws std::out_of_range for a version number
+  // that is too large, and whatever its components' constructors throw.
+  explicit orv_dataset(const std::string& directory);
+
+  // The version text as found, for messages and the record: 2022b.1.1 for
+  // "/var/db/timezone/tz/2022b.1.1", and 2022a.1.0 where the system partition's "+VERSION" holds
+  // 2022a. Never empty.
+  std::string get_version_string() const;
+
+  // Whether each component can stand in for the one at the same position in `other`.
+  bool compatible_schema(const orv_dataset& other) const;
+
+  // Makes the store's links select this data set: the zoneinfo link first, then the ICU link.
+  // Throws the int error number of a link that could not be created, and leaves the rest undone.
+  void activate() const;
+
+  // Whether this version is newer than that of `other`; an equal one is not.
+  bool is_newer_than(const orv_dataset& other) const;
+
+  // Whether both data sets were named by the same text.
+  bool same_path(const orv_dataset& other) const;
+
+ private:
+  void create_components();
+
+  tz_version version;
+  std::string version_string;
+  std::string path;
+  std::vector<std::shared_ptr<const orv_dataset_component>> components;
+};
+
+}  // namespace kelvane
+
+#endif  // KELVANE_DATASET_ORV_DATASET_H_

@@ -1,0 +1,38 @@
+// The interface of a data set's components.
+
+#ifndef KELVANE_DATASET_ORV_DATASET_COMPONENT_H_
+#define KELVANE_DATASET_ORV_DATASET_COMPONENT_H_
+
+#include <string>
+
+namespace kelvane {
+
+// One kind of data of a data set, with the store's fixed link to it. Immutable once constructed.
+//
+// There is no virtual destructor, and none that a user of this interface could call: a component is
+// created as its concrete type, through std::make_shared, and the handle destroys it as that type.
+class orv_dataset_component {
+ public:
+  orv_dataset_component(const orv_dataset_component&) = delete;
+  orv_dataset_component& operator=(const orv_dataset_component&) = delete;
+
+  // Whether this component can stand in for `other`.
+  virtual bool compatible_schema(const orv_dataset_component& other) const = 0;
+
+  // Makes the store's link of this kind select this component's data, by removing the link and
+  // creating it anew. Throws the int error number of a link that could not be created, after its
+  // warning; the old link is gone then.
+  virtual void activate() const = 0;
+
+ protected:
+  orv_dataset_component() = default;
+  explicit orv_dataset_component(const std::string& directory) : dataset_path(directory) {}
+  ~orv_dataset_component() = default;
+
+  // The data set's directory as given; empty for the system partition.
+  const std::string dataset_path;
+};
+
+}  // namespace kelvane
+
+#endif  // KELVANE_DATASET_ORV_DATASET_COMPONENT_H_

@@ -1,0 +1,57 @@
+// The ICU time-zone data of a data set.
+
+#ifndef KELVANE_DATASET_ORV_ICU_H_
+#define KELVANE_DATASET_ORV_ICU_H_
+
+#include <string>
+
+#include "dataset/orv_dataset_component.h"
+
+namespace kelvane {
+
+// The store's link to the active ICU directory. There is none while the system partition's is
+// active.
+inline constexpr char icu_link[] = "/var/db/timezone/icutz";
+
+// Where that link was in an older layout of the store.
+inline constexpr char legacy_icu_link[] = "/var/db/icutz";
+
+// An ICU directory, DIRECTORY/icutz for a data set in DIRECTORY, with the schema of its data: a
+// number and one of the letters l, b and e, such as 44l. Schemas are texts: 44l and 044l differ.
+class orv_icu final : public orv_dataset_component {
+ public:
+  // The system partition's ICU directory.
+  orv_icu();
+
+  // That of the data set in `directory`, which is taken as it is; the empty string stands for the
+  // system partition. The schema is:
+  //
+  //  1. On the system partition, the first word of the directory's file "icutzformat.txt", or empty.
+  //  2. In a release, the 44l of the first file icutz44l.dat that the directory lists, in no
+  //     particular order. It must lie directly in the directory, be a regular file, not a link, and
+  //     be readable by others. Where there is none, the schema is empty, after the warning "No ICU
+  //     schema found for DIRECTORY".
+  //
+  // Throws an int error number when the search cannot begin, after the warning "tz_icu::initialize:
+  // fts_open of ICU_DIRECTORY failed, ERROR".
+  explicit orv_icu(const std::string& directory);
+
+  // Whether `other` is an ICU directory of the same schema, the empty one included. Warns
+  // "orv_icu::compatible_schema: could not dynamic_cast other component" when it is of another kind.
+  bool compatible_schema(const orv_dataset_component& other) const override;
+
+  // Makes `icu_link` hold this directory, or only removes it for the system partition's, and
+  // removes `legacy_icu_link`. A link that cannot be removed is reported with "unlink of ICU
+  // softlink failed", after the warning of remove(); the second is kept when the first one is.
+  void activate() const override;
+
+ private:
+  void initialize();
+
+  std::string schema;
+  const std::string path;
+};
+
+}  // namespace kelvane
+
+#endif  // KELVANE_DATASET_ORV_ICU_H_

@@ -1,0 +1,38 @@
+// What the store's links say, in terms of data sets.
+//
+// A data set is named by its directory, in the form that orv_dataset takes: empty for the system
+// partition. Link targets are texts; none is resolved.
+
+#ifndef KELVANE_DATASET_STORE_LINKS_H_
+#define KELVANE_DATASET_STORE_LINKS_H_
+
+#include <string>
+
+namespace kelvane {
+
+// The store's link to the newest download; other software writes it.
+inline constexpr char latest_link[] = "/var/db/timezone/tz_latest";
+
+// Makes the links select the system partition's data set: the zoneinfo link is made anew, the ICU
+// link and the legacy ICU link are removed. Throws what the data set's construction and activate()
+// throw.
+void reset_to_system_partition();
+
+// The target of `latest_link` as it is, or empty when there is no such link. Warns and throws as
+// read_symlink() does.
+std::string latest_dataset_path();
+
+// The directory of the data set that the zoneinfo link selects. Warns and throws as read_symlink()
+// and dataset_path_from_link() do; a missing link counts as an empty target.
+std::string current_dataset_path();
+
+// The directory of the data set that a zoneinfo link with this target selects. Warns "Bad zoneinfo
+// link TARGET" and throws the int -1, which is no error number, for a target that selects none.
+//
+// Examples: "/usr/share/zoneinfo.default" gives the empty string, and
+// "/var/db/timezone/tz/2022b.1.1/zoneinfo" gives "/var/db/timezone/tz/2022b.1.1".
+std::string dataset_path_from_link(const std::string& target);
+
+}  // namespace kelvane
+
+#endif  // KELVANE_DATASET_STORE_LINKS_H_

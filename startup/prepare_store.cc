@@ -1,0 +1,33 @@
+#include "startup/prepare_store.h"
+
+#include <string>
+
+#include "dataset/orv_dataset.h"
+#include "foundation/descriptor.h"
+
+namespace kelvane {
+namespace {
+
+// This system has no data-protection classes: once a file system is mounted, its files stay readable
+// and writable in every lock state, which is all that is wanted. The command that sets the class
+// elsewhere is not sent: its number is free here, and may mean anything tomorrow.
+void keep_accessible_in_every_lock_state(const descriptor& /*directory*/) {}
+
+void set_protection_class(const std::string& path) {
+  const descriptor directory(path, O_RDONLY);
+  if (directory.number == -1) return;
+  keep_accessible_in_every_lock_state(directory);
+}
+
+}  // namespace
+
+void prepare_store() {
+  try {
+    set_protection_class("/var/db/timezone/");
+    set_protection_class(downloads_directory);
+  } catch (...) {
+    // Memory has run out; the stages that need the store will say so.
+  }
+}
+
+}  // namespace kelvane

@@ -1,0 +1,52 @@
+// A throw-away root directory for each test, described and compared as text.
+//
+// One entry a line, leading spaces ignored:
+//   /a/directory/
+//   /a/file = its content
+//   /a/link -> its target
+
+#ifndef KELVANE_TESTS_WORLD_H_
+#define KELVANE_TESTS_WORLD_H_
+
+#include <gtest/gtest.h>
+
+#include <functional>
+#include <source_location>
+#include <string>
+
+namespace kelvane {
+
+class world : public testing::Test {
+ protected:
+  void SetUp() override;
+  void TearDown() override;
+
+  // Entries of the system partition's data set and of a download.
+  static std::string system(const std::string& version, const std::string& schema = "44l");
+  static std::string download(const std::string& version, const std::string& schema = "44l");
+
+  // Makes what the entries say, and the directories on the way.
+  static void build(const std::string& entries);
+
+  // The entries below `top`, in order, without those below `except`.
+  static std::string listing(const std::string& top, const std::string& except = "");
+
+  // What an operation wrote on standard error, without the name before each line, then what it
+  // threw: "int 17", "invalid_argument badpath" or "out_of_range".
+  static std::string outcome(const std::function<void()>& operation);
+
+  // Expects equal lines; a wanted ": *" at a line's end stands for any error text.
+  static void expect_text(const std::string& actual, const std::string& wanted);
+
+  // Runs the program on what `before` adds to the world, and expects its warnings, "status N" if N
+  // is not 0, and what /var/db then holds besides the downloads, which must not have changed.
+  static void expect_run(const std::string& before, const std::string& after,
+                         std::source_location where = std::source_location::current());
+
+ private:
+  std::string root_;
+};
+
+}  // namespace kelvane
+
+#endif  // KELVANE_TESTS_WORLD_H_
