@@ -34,10 +34,9 @@ orv_dataset::orv_dataset(const std::string& directory) : path(directory) { creat
 std::string orv_dataset::get_version_string() const { return version_string; }
 
 bool orv_dataset::compatible_schema(const orv_dataset& other) const {
-  return std::equal(components.begin(), components.end(), other.components.begin(),
-                    other.components.end(), [](const auto& mine, const auto& theirs) {
-                      return mine->compatible_schema(*theirs);
-                    });
+  return std::equal(
+      components.begin(), components.end(), other.components.begin(), other.components.end(),
+      [](const auto& mine, const auto& theirs) { return mine->compatible_schema(*theirs); });
 }
 
 void orv_dataset::activate() const {

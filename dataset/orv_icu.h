@@ -26,7 +26,8 @@ class orv_icu final : public orv_dataset_component {
   // That of the data set in `directory`, which is taken as it is; the empty string stands for the
   // system partition. The schema is:
   //
-  //  1. On the system partition, the first word of the directory's file "icutzformat.txt", or empty.
+  //  1. On the system partition, the first word of the directory's file "icutzformat.txt", or
+  //  empty.
   //  2. In a release, the 44l of the first file icutz44l.dat that the directory lists, in no
   //     particular order. It must lie directly in the directory, be a regular file, not a link, and
   //     be readable by others. Where there is none, the schema is empty, after the warning "No ICU
@@ -37,7 +38,8 @@ class orv_icu final : public orv_dataset_component {
   explicit orv_icu(const std::string& directory);
 
   // Whether `other` is an ICU directory of the same schema, the empty one included. Warns
-  // "orv_icu::compatible_schema: could not dynamic_cast other component" when it is of another kind.
+  // "orv_icu::compatible_schema: could not dynamic_cast other component" when it is of another
+  // kind.
   bool compatible_schema(const orv_dataset_component& other) const override;
 
   // Makes `icu_link` hold this directory, or only removes it for the system partition's, and

@@ -21,8 +21,8 @@ class orv_zoneinfo final : public orv_dataset_component {
   // The system partition's zoneinfo directory.
   orv_zoneinfo();
 
-  // That of the data set in `directory`, which is taken as it is: nothing is normalised, and nothing
-  // need exist. The empty string stands for the system partition.
+  // That of the data set in `directory`, which is taken as it is: nothing is normalised, and
+  // nothing need exist. The empty string stands for the system partition.
   explicit orv_zoneinfo(const std::string& directory);
 
   // The release's name, such as 2023c: the first word of the directory's file "+VERSION". Empty

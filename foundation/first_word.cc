@@ -16,7 +16,8 @@ std::string first_word(const std::string& file) {
   char chunk[4096];
   for (ssize_t count = 0; (count = ::read(source.number, chunk, sizeof chunk)) > 0;) {
     std::string_view text(chunk, static_cast<std::size_t>(count));
-    if (word.empty()) text.remove_prefix(std::min(text.find_first_not_of(white_space), text.size()));
+    if (word.empty())
+      text.remove_prefix(std::min(text.find_first_not_of(white_space), text.size()));
     const std::size_t end = text.find_first_of(white_space);
     word += text.substr(0, end);
     if (end != std::string_view::npos) break;

@@ -12,7 +12,8 @@ namespace kelvane {
 // or more lower-case letters, and up to two numeric sub-versions. It cannot be turned back into
 // text: 02016a.01 and 2016a.1 are equal.
 struct tz_version {
-  // -1, empty, -1 and -1 together are the unset value; a single -1 stands for an absent sub-version.
+  // -1, empty, -1 and -1 together are the unset value; a single -1 stands for an absent
+  // sub-version.
   std::int32_t year = -1;
   std::string letters;
   std::int32_t major = -1;

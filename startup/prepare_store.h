@@ -5,8 +5,9 @@
 
 namespace kelvane {
 
-// Puts the directories of the store and of its downloads, where they exist, into the data-protection
-// class whose files stay accessible in every lock state of the device. Whatever fails is ignored.
+// Puts the directories of the store and of its downloads, where they exist, into the
+// data-protection class whose files stay accessible in every lock state of the device. Whatever
+// fails is ignored.
 void prepare_store();
 
 }  // namespace kelvane

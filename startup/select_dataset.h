@@ -17,7 +17,8 @@ namespace kelvane {
 //     active before and of the download, as in 2022a.1.0_2023c.1.0. A record that cannot be written
 //     is no failure. A download that is not activated is reported: "New update not compatible or
 //     older version: UPDATE vs. CURRENT".
-//  4. Where any of this fails, the links are reset to the system partition after the warning "Unable
+//  4. Where any of this fails, the links are reset to the system partition after the warning
+//  "Unable
 //     to locate data; resetting to system partition".
 //
 // Throws what that last reset throws.

@@ -22,20 +22,21 @@ class world : public testing::Test {
   void TearDown() override;
 
   // Entries of the system partition's data set and of a download.
-  static std::string system(const std::string& version, const std::string& schema = "44l");
+  static std::string data(const std::string& version, const std::string& schema = "44l");
   static std::string download(const std::string& version, const std::string& schema = "44l");
 
-  // Makes what the entries say, and the directories on the way.
+  // Makes what the entries say, and the directories on the way; a link replaces what is there.
   static void build(const std::string& entries);
 
   // The entries below `top`, in order, without those below `except`.
   static std::string listing(const std::string& top, const std::string& except = "");
 
   // What an operation wrote on standard error, without the name before each line, then what it
-  // threw: "int 17", "invalid_argument badpath" or "out_of_range".
+  // threw: "int 17", or an exception's text.
   static std::string outcome(const std::function<void()>& operation);
 
-  // Expects equal lines; a wanted ": *" at a line's end stands for any error text.
+  // Expects equal lines, the wanted entries in any order; ": *" at the end of a wanted line stands
+  // for any error text.
   static void expect_text(const std::string& actual, const std::string& wanted);
 
   // Runs the program on what `before` adds to the world, and expects its warnings, "status N" if N
