@@ -59,9 +59,9 @@ TEST_F(dataset, the_schema_is_in_the_name_of_a_readable_file_directly_in_the_dir
     const std::string directory = tz + std::to_string(&entry - &table[0].first);
     build(directory + "/f = \n" + directory + "/icutz/" + entry);
     build("/usr/share/icu/icutzformat.txt = " + schema);
-    expect_text(
-        outcome([&] { EXPECT_TRUE(orv_icu(directory).compatible_schema(orv_icu())) << entry; }),
-        schema.empty() ? "No ICU schema found for " + directory + ": *" : "");
+    SCOPED_TRACE(entry);
+    expect_text(outcome([&] { EXPECT_TRUE(orv_icu(directory).compatible_schema(orv_icu())); }),
+                schema.empty() ? "No ICU schema found for " + directory + ": *" : "");
   }
 }
 

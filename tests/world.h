@@ -11,7 +11,6 @@
 #include <gtest/gtest.h>
 
 #include <functional>
-#include <source_location>
 #include <string>
 
 namespace kelvane {
@@ -42,9 +41,10 @@ class world : public testing::Test {
   // Runs the program on what `before` adds to the world, and expects its warnings, "status N" if N
   // is not 0, and what /var/db then holds besides the downloads, which must not have changed.
   static void expect_run(const std::string& before, const std::string& after,
-                         std::source_location where = std::source_location::current());
+                         const char* file = __builtin_FILE(), int line = __builtin_LINE());
 
  private:
+  int outer_root_ = -1;
   std::string root_;
 };
 

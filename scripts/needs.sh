@@ -1,0 +1,44 @@
+# Sourced by the other scripts: what they need of the machine, whoever runs them and from wherever.
+# shellcheck shell=bash
+
+set -euo pipefail
+cd "$(dirname "$(realpath "${BASH_SOURCE[0]}")")/.."
+exec </dev/null
+umask 022
+unset TZ TZDIR
+export LC_ALL=C DEBIAN_FRONTEND=noninteractive
+
+fail() {
+  echo "$(basename "$0"): $*" >&2
+  exit 1
+}
+
+# Runs a command and shows its output only where it fails, which ends the script.
+quietly() {
+  local output
+  output=$("$@" 2>&1) || {
+    printf '%s\n' "$output" >&2
+    fail "this has failed: $*"
+  }
+}
+
+need_packages() {
+  local package missing=()
+  for package; do
+    [[ $(dpkg-query -W -f='${Status}' "$package" 2>&1) == *' installed' ]] || missing+=("$package")
+  done
+  ((${#missing[@]} > 0)) || return 0
+  ((EUID == 0)) || fail "packages are missing; as root: apt-get install ${missing[*]}"
+  echo "Installing ${missing[*]}"
+  local install=(apt-get install --yes --no-install-recommends --no-remove "${missing[@]}")
+  # Fails where the package lists are missing or older than the archive.
+  "${install[@]}" &>/dev/null && return
+  quietly apt-get update
+  quietly "${install[@]}"
+}
+
+# A throw-away root is entered by root, or by a user who is root in a namespace of his own.
+need_throw_away_roots() {
+  ((EUID == 0)) || unshare --map-root-user true 2>/dev/null ||
+    fail "this kernel gives no user namespace to an ordinary user: run it as root"
+}
