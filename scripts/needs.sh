@@ -40,5 +40,5 @@ need_packages() {
 # A throw-away root is entered by root, or by a user who is root in a namespace of his own.
 need_throw_away_roots() {
   ((EUID == 0)) || unshare --map-root-user true 2>/dev/null ||
-    fail "this kernel gives no user namespace to an ordinary user: run it as root"
+    fail "an ordinary user gets no user namespace here (unshare --map-root-user); run it as root"
 }
