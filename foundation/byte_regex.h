@@ -30,7 +30,7 @@ struct byte_traits {
   char translate_nocase(char byte) const { return byte; }
   bool isctype(char, char_class_type) const { return false; }
   int value(char digit, int) const { return digit - '0'; }
-  locale_type imbue(locale_type) { return {}; }
+  locale_type imbue(const locale_type&) { return {}; }
   locale_type getloc() const { return {}; }
 
   template <class Iterator>
