@@ -2,6 +2,7 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <exception>
 
 #include "foundation/warning.h"
 #include "startup/migrate_legacy_icutz.h"
@@ -28,9 +29,16 @@ bool completes(void (*stage)(), const char* complaint) {
   }
 }
 
+// Without memory for an exception there is nothing that a handler could catch.
+[[noreturn]] void give_up() {
+  kelvane::warn("Could not go on");
+  std::_Exit(EXIT_FAILURE);
+}
+
 }  // namespace
 
 int main() {
+  std::set_terminate(give_up);
   kelvane::prepare_warnings();
   kelvane::prepare_store();
   kelvane::migrate_legacy_icutz();
