@@ -37,8 +37,14 @@ need_packages() {
   quietly "${install[@]}"
 }
 
-# A throw-away root is entered by root, or by a user who is root in a namespace of his own.
+# A throw-away root is entered by root, or by a user who is root in a namespace of their own.
 need_throw_away_roots() {
   ((EUID == 0)) || unshare --map-root-user true 2>/dev/null ||
     fail "an ordinary user gets no user namespace here (unshare --map-root-user); run it as root"
+}
+
+in_root() { # root directory, command
+  local namespace=()
+  ((EUID == 0)) || namespace=(--map-root-user)
+  unshare "${namespace[@]}" --root="$1" "${@:2}"
 }
