@@ -15,7 +15,8 @@ namespace {
 // A closed standard error would lend its number to the next file opened, and that file would
 // receive the warnings. O_PATH gives a descriptor that no write can reach, without any device file.
 void occupy_standard_error() {
-  while (::fcntl(STDERR_FILENO, F_GETFD) == -1 && ::open("/", O_PATH | O_CLOEXEC) != -1) {
+  while (::fcntl(STDERR_FILENO, F_GETFD) == -1 && errno == EBADF) {
+    if (::open("/", O_PATH | O_CLOEXEC) == -1) return;
   }
 }
 

@@ -1,5 +1,6 @@
 // kelvane: one pass over the time-zone data of a device that starts.
 
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
@@ -29,16 +30,22 @@ bool completes(void (*stage)(), const char* complaint) {
   }
 }
 
-// Without memory for an exception there is nothing that a handler could catch.
 [[noreturn]] void give_up() {
   kelvane::warn("Could not go on");
   std::_Exit(EXIT_FAILURE);
 }
 
+// What is left when memory runs out where no handler can catch it: while an exception is raised,
+// or in the C library's fts_open(3), which uses the memory for its root whether granted or not.
+void prepare_to_give_up() {
+  std::set_terminate(give_up);
+  std::signal(SIGSEGV, [](int) { give_up(); });
+}
+
 }  // namespace
 
 int main() {
-  std::set_terminate(give_up);
+  prepare_to_give_up();
   kelvane::prepare_warnings();
   kelvane::prepare_store();
   kelvane::migrate_legacy_icutz();

@@ -17,8 +17,9 @@ constexpr char default_zone[] = "America/Los_Angeles";
 
 // remove(3), because an empty directory must give way as well.
 void replace_link(const std::string& target) {
-  std::remove(localtime_link);
-  create_symlink(target, localtime_link);
+  const std::string link = localtime_link;  // Before the removal: memory may run out.
+  std::remove(link.c_str());
+  create_symlink(target, link);
 }
 
 // Throws where the link has to be reset; -1 where no call has failed.

@@ -1,0 +1,48 @@
+# shellcheck shell=bash
+# A device in a throw-away root, described as text like the worlds of the other tests. Sourced.
+# In: $program, a static executable. Out: $work, a directory that is removed at the end.
+
+set -euo pipefail
+[ "$(id -u)" = 0 ] || exec unshare --map-root-user bash "$0" "$@"
+work=$(mktemp -d)
+trap 'rm -rf "$work"' EXIT
+
+# device ROOT: a root with the program and the entries that standard input describes, one a line:
+# "/file = content" or "/link -> target".
+device() {
+  local path kind value
+  mkdir -p "$1/sbin"
+  cp "$program" "$1/sbin/kelvane"
+  while read -r path kind value; do
+    mkdir -p "$1${path%/*}"
+    case $kind in
+      '=') printf '%s\n' "$value" >"$1$path" ;;
+      '->') ln -s "$value" "$1$path" ;;
+    esac
+  done
+}
+
+# The entries of the system partition, of a download, and of links that select one.
+system() {
+  printf '/usr/share/%s\n' "zoneinfo.default/+VERSION = $1" "zoneinfo.default/Europe/Paris = TZif" \
+    "icu/icutzformat.txt = 44l"
+}
+download() {
+  printf "/var/db/timezone/tz/$1/%s\n" "zoneinfo/Europe/Paris = TZif" "icutz/icutz${2-44l}.dat = data"
+}
+on() {
+  printf "/var/db/timezone/%s\n" "zoneinfo -> /var/db/timezone/tz/$1/zoneinfo" \
+    "icutz -> /var/db/timezone/tz/$1/icutz"
+}
+
+# snapshot ROOT: $store, the store's links and record as text, and $data, everything that no run
+# may change, with sizes and times.
+snapshot() {
+  local all
+  all=$(cd "$1" && find usr var/db/timezone/tz -printf '%p %y %l %s %T@\n' && echo ---- &&
+    find var/db -path var/db/timezone/tz -prune -o ! -type d -printf '/%p -> %l\n' | sort)
+  data=${all%%----*} store=${all#*----$'\n'}
+  record=
+  ! [ -f "$1/var/db/timezone/TZVersionDiffRecord" ] ||
+    record=$(<"$1/var/db/timezone/TZVersionDiffRecord")
+}

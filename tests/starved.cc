@@ -1,0 +1,36 @@
+// Linked with --wrap=malloc, --wrap=calloc and --wrap=realloc into a second program, whose
+// allocation number $ALLOCATION fails, or all from that one on where a "+" follows. The C library's
+// own start-up, which no program survives without memory, is not counted.
+
+#include <cerrno>
+#include <cstddef>
+#include <cstdlib>
+
+extern "C" {
+
+void* __real_malloc(std::size_t);
+void* __real_calloc(std::size_t, std::size_t);
+void* __real_realloc(void*, std::size_t);
+
+static long count = 0;
+static bool counting = false;
+[[gnu::constructor(101)]] static void begin() { counting = true; }
+
+static bool fails() {
+  if (!counting) return false;
+  char* end = nullptr;
+  const long failing = std::strtol(std::getenv("ALLOCATION"), &end, 10);
+  ++count;
+  if (count != failing && (count < failing || *end != '+')) return false;
+  errno = ENOMEM;
+  return true;
+}
+
+void* __wrap_malloc(std::size_t size) { return fails() ? nullptr : __real_malloc(size); }
+void* __wrap_calloc(std::size_t n, std::size_t size) {
+  return fails() ? nullptr : __real_calloc(n, size);
+}
+void* __wrap_realloc(void* old, std::size_t size) {
+  return fails() ? nullptr : __real_realloc(old, size);
+}
+}
