@@ -34,7 +34,7 @@ void warn(const char* format, ...) {
 
 void prepare_warnings() {
   occupy_standard_error();
-  // A log without a reader and a file at its size limit are errors of a write, not ends of the run.
+  // A log without a reader and a file at its size limit are failed writes, not ends of the run.
   std::signal(SIGPIPE, SIG_IGN);
   std::signal(SIGXFSZ, SIG_IGN);
   // Fully buffered, because a line-buffered stream would cut a message at a newline in a path.

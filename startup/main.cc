@@ -1,12 +1,11 @@
 // kelvane: one pass over the time-zone data of a device that starts.
 
-#include <csignal>
 #include <cstdio>
 #include <cstdlib>
-#include <exception>
 
 #include "foundation/warning.h"
 #include "startup/migrate_legacy_icutz.h"
+#include "startup/prepare_process.h"
 #include "startup/prepare_store.h"
 #include "startup/repair_localtime.h"
 #include "startup/select_dataset.h"
@@ -30,23 +29,11 @@ bool completes(void (*stage)(), const char* complaint) {
   }
 }
 
-[[noreturn]] void give_up() {
-  kelvane::warn("Could not go on");
-  std::_Exit(EXIT_FAILURE);
-}
-
-// What is left when memory runs out where no handler can catch it: while an exception is raised,
-// or in the C library's fts_open(3), which uses the memory for its root whether granted or not.
-void prepare_to_give_up() {
-  std::set_terminate(give_up);
-  std::signal(SIGSEGV, [](int) { give_up(); });
-}
-
 }  // namespace
 
 int main() {
-  prepare_to_give_up();
   kelvane::prepare_warnings();
+  kelvane::prepare_process();
   kelvane::prepare_store();
   kelvane::migrate_legacy_icutz();
   std::remove(obsolete_icu);

@@ -32,8 +32,13 @@ void write_version_difference(const orv_dataset& active, const orv_dataset& upda
   // A named pipe in the record's place would hold the run until somebody reads it.
   struct stat status = {};
   if (::stat(version_difference_record, &status) == 0 && S_ISFIFO(status.st_mode)) return;
-  std::ofstream record(version_difference_record, std::ios::out | std::ios::trunc);
-  record << active.get_version_string() << "_" << update.get_version_string();
+  // All memory is taken before the old record is gone.
+  const std::string text = active.get_version_string() + "_" + update.get_version_string();
+  char buffer[256];
+  std::ofstream record;
+  record.rdbuf()->pubsetbuf(buffer, sizeof buffer);
+  record.open(version_difference_record, std::ios::out | std::ios::trunc);
+  record << text;
 }
 
 // `current` and not `active` is what an update is measured against: a rejected data set's version

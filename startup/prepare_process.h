@@ -1,0 +1,20 @@
+// Before the stages: independence of whatever started the process.
+
+#ifndef KELVANE_STARTUP_PREPARE_PROCESS_H_
+#define KELVANE_STARTUP_PREPARE_PROCESS_H_
+
+namespace kelvane {
+
+// Makes the run end by exit, and with the same links, where little is left to it:
+//
+//  1. The files that it opens find room however few descriptors the process may have, because
+//     standard input and output, which the run does not use, are closed.
+//  2. Where memory runs out and no handler can catch it, the run ends with status 1 after the
+//     warning "Could not go on".
+//
+// prepare_warnings() comes first: a closed standard error must be seen to before these.
+void prepare_process();
+
+}  // namespace kelvane
+
+#endif  // KELVANE_STARTUP_PREPARE_PROCESS_H_
