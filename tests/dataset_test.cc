@@ -66,11 +66,13 @@ TEST_F(dataset, the_schema_is_in_the_name_of_a_readable_file_directly_in_the_dir
 }
 
 TEST_F(dataset, schemas_are_compared_as_texts_and_with_icu_data_only) {
-  build(data("2022a") + download("1a", "044l") + download("2a", "44b") + download("3a"));
+  build(data("2022a") + download("1a", "044l") + download("2a", "44b") + download("3a") +
+        download("4a") + tz + "5a/icutz -> ../4a/icutz");
   ASSERT_EQ(::chmod((tz + "3a/icutz/icutz44l.dat").c_str(), 0660), 0);
   for (const std::string version : {"1a", "2a", "3a"}) {
     outcome([&] { EXPECT_FALSE(orv_icu(tz + version).compatible_schema(orv_icu())) << version; });
   }
+  EXPECT_TRUE(orv_icu(tz + "5a").compatible_schema(orv_icu()));
   EXPECT_TRUE(orv_zoneinfo().compatible_schema(orv_icu()));
   expect_text(outcome([] { EXPECT_FALSE(orv_icu().compatible_schema(orv_zoneinfo())); }),
               "orv_icu::compatible_schema: could not dynamic_cast other component: *");

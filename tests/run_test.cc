@@ -28,7 +28,7 @@ class run : public world {
 
 TEST_F(run, a_newer_compatible_download_is_activated_once) {
   const std::string after = kept + on("2023c.1.0") + record + "2022a.1.0_2023c.1.0";
-  expect_run(device + on_system, after);
+  expect_run(device + on_system + record + "longer than what is written now", after);
   expect_run("", nothing_new + after);
 }
 
@@ -72,10 +72,19 @@ TEST_F(run, a_rejected_data_set_is_still_what_an_update_is_compared_with) {
   expect_run(device + data("2024a") + download("2023b") + on("2023b"), R"(
       Symlink points at data incompatible with installed system: *
       )" + kept + on("2023c.1.0") + record + "2024a.1.0_2023c.1.0");
-  expect_run(download("2025a", "44b") + on("2025a"), R"(
+}
+
+TEST_F(run, an_incompatible_data_set_is_reported_before_the_links_are_reset) {
+  const std::string directory = "/var/db/timezone/icutz/\n";
+  expect_run(device + download("2025a", "44b") + directory +
+                 "/var/db/timezone/zoneinfo -> /var/db/timezone/tz/2025a/zoneinfo",
+             R"(
       Symlink points at data incompatible with installed system: *
+      remove: could not remove /var/db/timezone/icutz: Is a directory
+      unlink of ICU softlink failed: Is a directory
       New update not compatible or older version: 2023c.1.0 vs. 2025a: *
-      )" + kept + on_system + record + "2024a.1.0_2023c.1.0");
+      )" + directory +
+                 kept + on_system);
 }
 
 TEST_F(run, an_incompatible_update_is_not_activated) {
@@ -117,14 +126,15 @@ TEST_F(run, a_version_number_too_large_resets_the_links) {
 }
 
 TEST_F(run, an_activation_that_stops_half_way_is_reset_and_not_recorded) {
-  expect_run(device + on_system + "/var/db/icutz -> /usr\n/var/db/timezone/icutz/below = x", R"(
+  expect_run(device + on_system + "/var/db/icutz -> /missing\n/var/db/timezone/icutz/", R"(
       remove: could not remove /var/db/timezone/icutz: Is a directory
       unlink of ICU softlink failed: Is a directory
       create_symlink: from /var/db/timezone/icutz to /var/db/timezone/tz/2023c.1.0/icutz: File exists
       Unable to locate data; resetting to system partition: File exists
       remove: could not remove /var/db/timezone/icutz: Is a directory
       unlink of ICU softlink failed: Is a directory
-      /var/db/timezone/icutz/below = x
+      /var/db/icutz -> /missing
+      /var/db/timezone/icutz/
       )" + kept + on_system);
 }
 
