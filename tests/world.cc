@@ -40,11 +40,11 @@ void world::SetUp() {
   ASSERT_NE(::mkdtemp(name), nullptr);
   root_ = name;
   fs::copy(KELVANE_RUNTIME, root_, fs::copy_options::recursive);
-  // AddressSanitizer looks for the bounds of the stack, and for leaks, in /proc.
-  if (fs::exists(root_ + "/proc")) {
+  if (const std::string shared = KELVANE_SHARED_DIRECTORY; !shared.empty()) {
     ASSERT_EQ(::unshare(CLONE_NEWNS), 0);
     ASSERT_EQ(::mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr), 0);
-    ASSERT_EQ(::mount("/proc", (root_ + "/proc").c_str(), nullptr, MS_REC | MS_BIND, nullptr), 0);
+    ASSERT_EQ(::mount(shared.c_str(), (root_ + shared).c_str(), nullptr, MS_REC | MS_BIND, nullptr),
+              0);
   }
   outer_root_ = ::open("/", O_RDONLY | O_CLOEXEC);
   ASSERT_TRUE(::chroot(name) == 0 && ::chdir("/") == 0);
@@ -52,7 +52,7 @@ void world::SetUp() {
 
 void world::TearDown() {
   ASSERT_TRUE(::fchdir(outer_root_) == 0 && ::chroot(".") == 0);
-  ::umount2((root_ + "/proc").c_str(), MNT_DETACH);
+  ::umount2((root_ + KELVANE_SHARED_DIRECTORY).c_str(), MNT_DETACH);
   fs::remove_all(root_);
 }
 
