@@ -1,4 +1,4 @@
-# shellcheck shell=bash
+# shellcheck shell=bash disable=SC2034,SC2154
 # A device in a throw-away root, described as text like the worlds of the other tests. Sourced.
 # In: $program, a static executable. Out: $work, a directory that is removed at the end.
 
