@@ -6,6 +6,7 @@
 #include <cstddef>
 #include <cstdlib>
 
+// NOLINTBEGIN(readability-identifier-naming): the linker's names.
 extern "C" {
 
 void* __real_malloc(std::size_t);
@@ -18,8 +19,10 @@ static bool counting = false;
 
 static bool fails() {
   if (!counting) return false;
+  const char* const number = std::getenv("ALLOCATION");
+  if (number == nullptr) return false;
   char* end = nullptr;
-  const long failing = std::strtol(std::getenv("ALLOCATION"), &end, 10);
+  const long failing = std::strtol(number, &end, 10);
   ++count;
   if (count != failing && (count < failing || *end != '+')) return false;
   errno = ENOMEM;
@@ -34,3 +37,4 @@ void* __wrap_realloc(void* old, std::size_t size) {
   return fails() ? nullptr : __real_realloc(old, size);
 }
 }
+// NOLINTEND(readability-identifier-naming)
