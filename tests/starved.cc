@@ -1,6 +1,6 @@
-// Linked with --wrap=malloc, --wrap=calloc and --wrap=realloc into a second program, whose
-// allocation number $ALLOCATION fails, or all from that one on where a "+" follows. The C library's
-// own start-up, which no program survives without memory, is not counted.
+// Linked with --wrap=malloc and --wrap=realloc into a second program, whose allocation number
+// $ALLOCATION fails, or all from that one on where a "+" follows. The C library's own start-up,
+// which no program survives without memory, is not counted.
 
 #include <cerrno>
 #include <cstddef>
@@ -10,7 +10,6 @@
 extern "C" {
 
 void* __real_malloc(std::size_t);
-void* __real_calloc(std::size_t, std::size_t);
 void* __real_realloc(void*, std::size_t);
 
 static long count = 0;
@@ -30,9 +29,6 @@ static bool fails() {
 }
 
 void* __wrap_malloc(std::size_t size) { return fails() ? nullptr : __real_malloc(size); }
-void* __wrap_calloc(std::size_t n, std::size_t size) {
-  return fails() ? nullptr : __real_calloc(n, size);
-}
 void* __wrap_realloc(void* old, std::size_t size) {
   return fails() ? nullptr : __real_realloc(old, size);
 }
