@@ -3,7 +3,8 @@
 # In: $program, a static executable. Out: $work, a directory that is removed at the end.
 
 set -euo pipefail
-[ "$(id -u)" = 0 ] || exec unshare --map-root-user bash "$0" "$@"
+umask 022
+[ "$(id -u)" = 0 ] || UNPRIVILEGED=yes exec unshare --map-root-user bash "$0" "$@"
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
 
