@@ -23,7 +23,7 @@ bool is_below_downloads(const std::string& path);
 // "/var/db/timezone/tz/" and the version text. Not changed once it is constructed.
 class orv_dataset {
  public:
-  // The system partition's data set.
+  // The system partition's data set; warns and throws as the next one does.
   orv_dataset();
 
   // The data set in `directory`. A version text that does not parse is warned about and counts as

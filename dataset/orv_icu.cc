@@ -60,7 +60,7 @@ orv_icu::orv_icu() : orv_icu(std::string()) {}
 
 orv_icu::orv_icu(const std::string& directory)
     : orv_dataset_component(directory),
-      path(directory.empty() ? "/usr/share/icu" : directory + "/icutz") {
+      path(directory.empty() ? system_icu : directory + "/icutz") {
   initialize();
 }
 

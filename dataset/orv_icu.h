@@ -16,6 +16,9 @@ inline constexpr char icu_link[] = "/var/db/timezone/icutz";
 // Where that link was in an older layout of the store.
 inline constexpr char legacy_icu_link[] = "/var/db/icutz";
 
+// The ICU directory of the system partition.
+inline constexpr char system_icu[] = "/usr/share/icu";
+
 // An ICU directory, DIRECTORY/icutz for a data set in DIRECTORY, with the schema of its data: a
 // number and one of the letters l, b and e, such as 44l. Schemas are texts: 44l and 044l differ.
 class orv_icu final : public orv_dataset_component {
@@ -26,8 +29,7 @@ class orv_icu final : public orv_dataset_component {
   // That of the data set in `directory`, which is taken as it is; the empty string stands for the
   // system partition. The schema is:
   //
-  //  1. On the system partition, the first word of the directory's file "icutzformat.txt", or
-  //  empty.
+  //  1. On the system partition, the first word of the file "icutzformat.txt", or empty.
   //  2. In a release, the 44l of the first file icutz44l.dat that the directory lists, in no
   //     particular order. It must lie directly in the directory, be a regular file, not a link, and
   //     be readable by others. Where there is none, the schema is empty, after the warning "No ICU
@@ -38,8 +40,7 @@ class orv_icu final : public orv_dataset_component {
   explicit orv_icu(const std::string& directory);
 
   // Whether `other` is an ICU directory of the same schema, the empty one included. Warns
-  // "orv_icu::compatible_schema: could not dynamic_cast other component" when it is of another
-  // kind.
+  // "orv_icu::compatible_schema: could not dynamic_cast other component" for another kind.
   bool compatible_schema(const orv_dataset_component& other) const override;
 
   // Makes `icu_link` hold this directory, or only removes it for the system partition's, and

@@ -1,5 +1,6 @@
 #include "dataset/store_links.h"
 
+#include <cstddef>
 #include <string_view>
 
 #include "dataset/orv_dataset.h"

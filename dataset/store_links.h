@@ -1,4 +1,4 @@
-// What the store's links say, in terms of data sets.
+// The store's links in terms of data sets: what they say, and how they are reset.
 //
 // A data set is named by its directory, in the form that orv_dataset takes: empty for the system
 // partition. Link targets are texts; none is resolved.

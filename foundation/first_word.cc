@@ -1,6 +1,10 @@
 #include "foundation/first_word.h"
 
+#include <fcntl.h>
+#include <unistd.h>
+
 #include <algorithm>
+#include <cstddef>
 #include <string_view>
 
 #include "foundation/descriptor.h"

@@ -13,7 +13,8 @@ namespace kelvane {
 namespace {
 
 // A closed standard error would lend its number to the next file opened, and that file would
-// receive the warnings. O_PATH gives a descriptor that no write can reach, without any device file.
+// receive the warnings. O_PATH gives a descriptor that no write can reach, without any device file;
+// open(2) takes the lowest free number, so that at most three calls reach that of standard error.
 void occupy_standard_error() {
   while (::fcntl(STDERR_FILENO, F_GETFD) == -1 && errno == EBADF) {
     if (::open("/", O_PATH | O_CLOEXEC) == -1) return;

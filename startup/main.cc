@@ -16,6 +16,7 @@ namespace {
 [[gnu::used, gnu::retain]] const char identification[] =
     "@(#)PROGRAM:kelvane  PROJECT:Orvalen-80\n";
 
+// Left by older layouts: a link, a file or an empty directory. Anything else there stays.
 constexpr char obsolete_icu[] = "/var/db/icu";
 
 // Runs a stage that may fail for good; where it does, says so and returns false.
@@ -32,7 +33,6 @@ bool completes(void (*stage)(), const char* complaint) {
 }  // namespace
 
 int main() {
-  kelvane::prepare_warnings();
   kelvane::prepare_process();
   kelvane::prepare_store();
   kelvane::migrate_legacy_icutz();

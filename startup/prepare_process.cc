@@ -19,10 +19,11 @@ namespace {
 }  // namespace
 
 void prepare_process() {
+  prepare_warnings();  // Before standard input and output make room in standard error's stead.
   ::close(STDIN_FILENO);
   ::close(STDOUT_FILENO);
   // Raising an exception takes memory, and the C library's fts_open(3) uses the memory for its root
-  // whether granted or not.
+  // whether granted or not; no lock of a stream is held there, so that give_up() may warn.
   std::set_terminate(give_up);
   std::signal(SIGSEGV, [](int) { give_up(); });
 }

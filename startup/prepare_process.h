@@ -7,12 +7,12 @@ namespace kelvane {
 
 // Makes the run end by exit, and with the same links, where little is left to it:
 //
-//  1. The files that it opens find room however few descriptors the process may have, because
+//  1. The files that it opens find room even where the process may have three descriptors, because
 //     standard input and output, which the run does not use, are closed.
 //  2. Where memory runs out and no handler can catch it, the run ends with status 1 after the
 //     warning "Could not go on".
 //
-// prepare_warnings() comes first: a closed standard error must be seen to before these.
+// It calls prepare_warnings() first.
 void prepare_process();
 
 }  // namespace kelvane

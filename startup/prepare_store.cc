@@ -1,5 +1,7 @@
 #include "startup/prepare_store.h"
 
+#include <fcntl.h>
+
 #include <string>
 
 #include "dataset/orv_dataset.h"
@@ -9,8 +11,9 @@ namespace kelvane {
 namespace {
 
 // This system has no data-protection classes: once a file system is mounted, its files stay
-// readable and writable in every lock state, which is all that is wanted. The command that sets the
-// class elsewhere is not sent: its number is free here, and may mean anything tomorrow.
+// readable and writable in every lock state, which is all that is wanted. The fcntl(2) command for
+// it on systems that have them is not sent: its number is free here, and may mean anything
+// tomorrow.
 void keep_accessible_in_every_lock_state(const descriptor& /*directory*/) {}
 
 void set_protection_class(const std::string& path) {

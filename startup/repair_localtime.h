@@ -9,7 +9,8 @@ namespace kelvane {
 //
 //  1. A target that begins with "/var/db/timezone/zoneinfo" stays, whether its zone exists or not.
 //  2. In a target that begins with "/usr/share/zoneinfo", that text is replaced by
-//     "/var/db/timezone/zoneinfo", if the result exists: "Correcting localtime link to TARGET".
+//     "/var/db/timezone/zoneinfo", after the warning "Correcting localtime link to TARGET" and
+//     provided that the result exists.
 //  3. Anything else, be it a missing link, a file or a failure of 1 or 2, is replaced by a link to
 //     the default zone: "localtime link invalid; resetting to America/Los_Angeles".
 //

@@ -29,7 +29,8 @@ system() {
     "icu/icutzformat.txt = 44l"
 }
 download() {
-  printf "/var/db/timezone/tz/$1/%s\n" "zoneinfo/Europe/Paris = TZif" "icutz/icutz${2-44l}.dat = data"
+  printf "/var/db/timezone/tz/$1/%s\n" "zoneinfo/Europe/Paris = TZif" \
+    "icutz/icutz${2-44l}.dat = data"
 }
 on() {
   printf "/var/db/timezone/%s\n" "zoneinfo -> /var/db/timezone/tz/$1/zoneinfo" \
