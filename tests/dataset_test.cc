@@ -29,7 +29,7 @@ TEST_F(dataset, a_link_target_names_a_data_set_or_is_bad) {
 }
 
 TEST_F(dataset, a_version_text_is_the_directory_name_or_made_from_the_system_partition) {
-  build(data("2022a") + download("2022b.1.1"));
+  build(system("2022a") + download("2022b.1.1"));
   const orv_dataset system, update(tz + "2022b.1.1");
   EXPECT_EQ(system.get_version_string(), "2022a.1.0");
   EXPECT_EQ(update.get_version_string(), "2022b.1.1");
@@ -60,7 +60,7 @@ TEST_F(dataset, the_schema_is_in_the_name_of_a_readable_file_directly_in_the_dir
 }
 
 TEST_F(dataset, schemas_are_compared_as_texts_and_with_icu_data_only) {
-  build(data("2022a") + download("1a", "044l") + download("2a", "44b") + download("3a") +
+  build(system("2022a") + download("1a", "044l") + download("2a", "44b") + download("3a") +
         download("4a") + tz + "5a/icutz -> ../4a/icutz");
   ASSERT_EQ(::chmod((tz + "3a/icutz/icutz44l.dat").c_str(), 0660), 0);
   for (const std::string version : {"1a", "2a", "3a"}) {

@@ -4,7 +4,7 @@
 
 set -euo pipefail
 umask 022
-[ "$(id -u)" = 0 ] || UNPRIVILEGED=yes exec unshare --map-root-user bash "$0" "$@"
+((EUID == 0)) || UNPRIVILEGED=yes exec unshare --map-root-user bash "$0" "$@"
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
 
@@ -45,6 +45,6 @@ snapshot() {
     find var/db -path var/db/timezone/tz -prune -o ! -type d -printf '/%p -> %l\n' | sort)
   data=${all%%----*} store=${all#*----$'\n'}
   record=
-  ! [ -f "$1/var/db/timezone/TZVersionDiffRecord" ] ||
+  [[ ! -f $1/var/db/timezone/TZVersionDiffRecord ]] ||
     record=$(<"$1/var/db/timezone/TZVersionDiffRecord")
 }

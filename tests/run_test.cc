@@ -18,7 +18,7 @@ class run : public world {
   const std::string record = "/var/db/timezone/TZVersionDiffRecord = ";
   // Links that no run changes on a device whose newest download is 2023c.1.0.
   const std::string kept = zone + "/var/db/timezone/tz_latest -> /var/db/timezone/tz/2023c.1.0\n";
-  const std::string device = data("2022a") + download("2023c.1.0") + kept;
+  const std::string device = system("2022a") + download("2023c.1.0") + kept;
   const std::string nothing_new =
       "New update not compatible or older version: 2023c.1.0 vs. 2023c.1.0: *\n";
 
@@ -35,7 +35,7 @@ TEST_F(run, a_newer_compatible_download_is_activated_once) {
 }
 
 TEST_F(run, a_fresh_device_gets_its_links) {
-  expect_run(data("2022a") + "/var/db/timezone/tz/", R"(
+  expect_run(system("2022a") + "/var/db/timezone/tz/", R"(
       Bad zoneinfo link : *
       Invalid current symlinks; resetting to system partition: *
       localtime link invalid; resetting to America/Los_Angeles: *
@@ -59,7 +59,7 @@ TEST_F(run, a_directory_in_the_zoneinfo_links_place_stays) {
 }
 
 TEST_F(run, a_rejected_data_set_is_still_what_an_update_is_compared_with) {
-  expect_run(device + data("2024a") + download("2023b") + on("2023b"), R"(
+  expect_run(device + system("2024a") + download("2023b") + on("2023b"), R"(
       Symlink points at data incompatible with installed system: *
       )" + kept + on("2023c.1.0") + record + "2024a.1.0_2023c.1.0");
 }
@@ -72,20 +72,20 @@ TEST_F(run, an_incompatible_data_set_is_rejected) {
 }
 
 TEST_F(run, an_incompatible_update_is_not_activated) {
-  expect_run(device + data("2022a", "45l") + on_system + record + "earlier", R"(
+  expect_run(device + system("2022a", "45l") + on_system + record + "earlier", R"(
       New update not compatible or older version: 2023c.1.0 vs. 2022a.1.0: *
       )" + kept + on_system + record + "earlier");
 }
 
 TEST_F(run, a_data_set_that_is_as_old_as_the_system_partition_stays) {
-  expect_run(device + data("2023c") + on("2023c.1.0"), nothing_new + kept + on("2023c.1.0"));
+  expect_run(device + system("2023c") + on("2023c.1.0"), nothing_new + kept + on("2023c.1.0"));
 }
 
 TEST_F(run, a_data_set_that_cannot_be_built_resets_the_links) {
   expect_run(device + on("99999999999a"),
              "Unable to locate data; resetting to system partition: *\n" + kept + on_system);
   const std::string elsewhere = "/var/db/timezone/tz_latest -> /opt/2023d\n";
-  expect_run(data("2022a") + download("2023b") + zone + on("2023b") + elsewhere, R"(
+  expect_run(system("2022a") + download("2023b") + zone + on("2023b") + elsewhere, R"(
       orv_dataset::create_components: bad path /opt/2023d: *
       Unable to locate data; resetting to system partition: *
       )" + elsewhere + zone + on_system);
@@ -118,12 +118,12 @@ TEST_F(run, the_legacy_icu_link_is_carried_over_unless_there_is_a_new_one) {
 
 TEST_F(run, a_legacy_icu_link_to_nothing_stays_until_an_activation) {
   const std::string full = "/var/db/icu/full/\n", stays = full + "/var/db/icutz -> /missing\n";
-  expect_run(data("2022a") + zone + on_system + stays, zone + on_system + stays);
+  expect_run(system("2022a") + zone + on_system + stays, zone + on_system + stays);
   expect_run(device, kept + on("2023c.1.0") + full + record + "2022a.1.0_2023c.1.0");
 }
 
 TEST_F(run, a_directory_in_the_legacy_icu_links_place_stays) {
-  expect_run(data("2022a") + zone + on_system + "/var/db/icutz/", R"(
+  expect_run(system("2022a") + zone + on_system + "/var/db/icutz/", R"(
       read_symlink: /var/db/icutz: Invalid argument
       Could not migrate /var/db/icutz to /var/db/timezone/icutz: Invalid argument
       remove: could not remove /var/db/icutz: Is a directory
@@ -152,7 +152,7 @@ TEST_F(run, the_localtime_link_is_made_to_lead_through_the_store) {
                       " to /var/db/timezone/zoneinfo/America/Los_Angeles: File exists\n" +
                       "Could not reset localtime link: File exists\nstatus 1\n" + link +
                       "/below/\n"}};
-  build(data("2022a") + on_system);
+  build(system("2022a") + on_system);
   for (const auto& [before, after] : table) {
     expect_run(link + before, after + on_system);
     ::unlink(link.c_str());

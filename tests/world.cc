@@ -63,7 +63,7 @@ void world::TearDown() {
   fs::remove_all(root_);
 }
 
-std::string world::data(const std::string& version, const std::string& schema) {
+std::string world::system(const std::string& version, const std::string& schema) {
   return "/usr/share/zoneinfo.default/+VERSION = " + version + "\n" +
          "/usr/share/zoneinfo.default/Europe/Paris = TZif\n" +
          "/usr/share/icu/icutzformat.txt = " + schema + "\n";

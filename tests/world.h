@@ -21,7 +21,7 @@ class world : public testing::Test {
   void TearDown() override;
 
   // Entries of the system partition's data set and of a download.
-  static std::string data(const std::string& version, const std::string& schema = "44l");
+  static std::string system(const std::string& version, const std::string& schema = "44l");
   static std::string download(const std::string& version, const std::string& schema = "44l");
 
   // Makes what the entries say, and the directories on the way; a link replaces what is there.
