@@ -1,8 +1,6 @@
 #include "foundation/warning.h"
 
 #include <err.h>
-#include <fcntl.h>
-#include <unistd.h>
 
 #include <cerrno>
 #include <csignal>
@@ -10,18 +8,6 @@
 #include <cstdio>
 
 namespace kelvane {
-namespace {
-
-// A closed standard error would lend its number to the next file opened, and that file would
-// receive the warnings. O_PATH gives a descriptor that no write can reach, without any device file;
-// open(2) takes the lowest free number, so that at most three calls reach that of standard error.
-void occupy_standard_error() {
-  while (::fcntl(STDERR_FILENO, F_GETFD) == -1 && errno == EBADF) {
-    if (::open("/", O_PATH | O_CLOEXEC) == -1) return;
-  }
-}
-
-}  // namespace
 
 void warn(const char* format, ...) {
   const int error = errno;
@@ -34,7 +20,6 @@ void warn(const char* format, ...) {
 }
 
 void prepare_warnings() {
-  occupy_standard_error();
   // A log without a reader and a file at its size limit are failed writes, not ends of the run.
   std::signal(SIGPIPE, SIG_IGN);
   std::signal(SIGXFSZ, SIG_IGN);

@@ -19,7 +19,7 @@ namespace {
 }  // namespace
 
 void prepare_process() {
-  prepare_warnings();  // Before standard input and output make room in standard error's stead.
+  prepare_warnings();
   ::close(STDIN_FILENO);
   ::close(STDOUT_FILENO);
   // Raising an exception takes memory, and the C library's fts_open(3) uses the memory for its root

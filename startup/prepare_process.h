@@ -7,12 +7,13 @@ namespace kelvane {
 
 // Makes the run end by exit, and with the same links, where little is left to it:
 //
-//  1. The files that it opens find room even where the process may have three descriptors, because
-//     standard input and output, which the run does not use, are closed.
+//  1. Standard input and output, which the run does not use, are closed. So the files that it opens
+//     find room even where the process may have three descriptors; and the one that it writes, open
+//     alone, never takes the number of a closed standard error, to receive the warnings.
 //  2. Where memory runs out and no handler can catch it, the run ends with status 1 after the
 //     warning "Could not go on".
 //
-// It calls prepare_warnings() first.
+// It calls prepare_warnings().
 void prepare_process();
 
 }  // namespace kelvane
