@@ -9,14 +9,14 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <cstdlib>
-#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <set>
 #include <sstream>
 #include <stdexcept>
+
+#include "foundation/warning.h"
 
 namespace fs = std::filesystem;
 
@@ -163,6 +163,6 @@ void world::expect_run(const std::string& before, const std::string& after, cons
 int main(int argc, char** argv) {
   ::umask(022);
   testing::InitGoogleTest(&argc, argv);
-  program_invocation_short_name = ::strdup("kelvane");
+  kelvane::prepare_warnings();
   return RUN_ALL_TESTS();
 }
