@@ -32,8 +32,8 @@ class orv_icu final : public orv_dataset_component {
   //  1. On the system partition, the first word of the file "icutzformat.txt", or empty.
   //  2. In a release, the 44l of the first file icutz44l.dat that the directory lists, in no
   //     particular order. It must lie directly in the directory, be a regular file, not a link, and
-  //     be readable by others. Where there is none, the schema is empty, after the warning "No ICU
-  //     schema found for DIRECTORY".
+  //     be readable by others, since all users' programs read it. Where there is none, the schema
+  //     is empty, after the warning "No ICU schema found for DIRECTORY".
   //
   // Throws an int error number when the search cannot begin, after the warning "tz_icu::initialize:
   // fts_open of ICU_DIRECTORY failed, ERROR".
