@@ -15,7 +15,17 @@
 namespace kelvane {
 namespace {
 
-class foundation : public world {};
+class foundation : public world {
+ protected:
+  // The outcome of parsing `text` into a version that was set before, and its fields then.
+  static std::string parsed(const std::string& text) {
+    tz_version version("1x.1.1");
+    std::ostringstream result;
+    result << outcome([&] { version.parse(text); }) << version.year << " " << version.letters << " "
+           << version.major << " " << version.minor;
+    return result.str();
+  }
+};
 
 TEST_F(foundation, file_operations_fail_with_a_warning_and_change_nothing_then) {
   build("/s/dir/below = x\n/s/gone = x\n/s/link -> no//target/\n/s/dead -> /missing");
@@ -28,23 +38,19 @@ TEST_F(foundation, file_operations_fail_with_a_warning_and_change_nothing_then) 
       {[] { EXPECT_EQ(read_symlink("/s/missing/link"), ""); }, ""},
       {[] { remove("/s/missing"); }, ""},
       {[] { remove("/s/gone"); }, ""},
-      {[] { EXPECT_FALSE(exists("/s/dead")); }, ""},
-      {[] { EXPECT_FALSE(exists("/s/dir/below/file")); }, ""}};
+      {[] { EXPECT_FALSE(exists("/s/dead") || exists("/s/dir/below/file")); }, ""}};
   for (const auto& [operation, wanted] : table) EXPECT_EQ(outcome(operation), wanted);
   EXPECT_EQ(listing("/s"), "/s/dead -> /missing\n/s/dir/below = x\n/s/link -> no//target/\n");
 }
 
 TEST_F(foundation, a_warning_that_cannot_be_written_is_lost_and_the_error_number_stays) {
-  const auto lost_then_seen = [] {
-    const int kept = ::dup(STDERR_FILENO);
+  outcome([] {
     ::close(STDERR_FILENO);
     errno = EISDIR;
     warn("lost");
-    ::dup2(kept, STDERR_FILENO);
-    ::close(kept);
-    warn("seen");
-  };
-  EXPECT_EQ(outcome(lost_then_seen), "seen: Is a directory\n");
+    EXPECT_EQ(errno, EISDIR);
+  });
+  expect_text(outcome([] { warn("seen"); }), "seen: *");
 }
 
 TEST_F(foundation, the_first_word_lies_between_white_space_of_any_kind) {
@@ -73,25 +79,15 @@ TEST_F(foundation, a_version_text_is_parsed_up_to_a_number_too_large) {
       {"2147483647z.2147483647.02147483647", "2147483647 z 2147483647 2147483647"},
       {"2147483648b", "stoi\n1 x 1 1"},
       {"2017b.2.2147483648", "stoi\n2017 b 2 1"}};
-  for (const auto& [text, fields] : table) {
-    tz_version version("1x.1.1");
-    std::ostringstream result;
-    result << outcome([&, input = text] { version.parse(input); }) << version.year << " "
-           << version.letters << " " << version.major << " " << version.minor;
-    EXPECT_EQ(result.str(), fields);
-  }
+  for (const auto& [text, fields] : table) EXPECT_EQ(parsed(text), fields);
 }
 
 TEST_F(foundation, a_text_of_another_shape_gives_the_unset_version) {
   for (const std::string text :
        {"", "2016", "2016A", "2016a.", "2016a.1.2.3", " 2016a", "2016a ", "a2016", "2016\xe9",
         "2016a.-1", "2016a1", "2016ax1", "2016a.1x0"}) {
-    tz_version version("2016a.1.0");
     const std::string warning = "Cannot parse version string " + text;
-    expect_text(outcome([&] { version.parse(text); }),
-                warning + ", results.size() = 0: *\n" + warning + ": *\n");
-    EXPECT_TRUE(version.year == -1 && version.letters.empty()) << text;
-    EXPECT_TRUE(version.major == -1 && version.minor == -1) << text;
+    expect_text(parsed(text), warning + ", results.size() = 0: *\n" + warning + ": *\n-1  -1 -1");
   }
 }
 

@@ -145,9 +145,7 @@ TEST_F(run, the_localtime_link_is_made_to_lead_through_the_store) {
       {" -> /usr/share/zoneinfo.default/Europe/Paris",
        correcting + ".default/Europe/Paris: *\n" + invalid + default_zone},
       {" -> /usr/share/zoneinf", invalid + default_zone},
-      {" -> ../zoneinfo/Europe/Paris", invalid + default_zone},
       {"/", unreadable + default_zone},
-      {" = a file", unreadable + default_zone},
       {"/below/", unreadable + "create_symlink: from " + link +
                       " to /var/db/timezone/zoneinfo/America/Los_Angeles: File exists\n" +
                       "Could not reset localtime link: File exists\nstatus 1\n" + link +

@@ -13,12 +13,10 @@ void* __real_malloc(std::size_t);
 void* __real_realloc(void*, std::size_t);
 
 static long count = 0;
-static bool counting = false;
-[[gnu::constructor(101)]] static void begin() { counting = true; }
+static const char* number = nullptr;
+[[gnu::constructor(101)]] static void begin() { number = std::getenv("ALLOCATION"); }
 
 static bool fails() {
-  if (!counting) return false;
-  const char* const number = std::getenv("ALLOCATION");
   if (number == nullptr) return false;
   char* end = nullptr;
   const long failing = std::strtol(number, &end, 10);

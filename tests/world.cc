@@ -31,9 +31,8 @@ std::vector<std::string> lines_of(const std::string& text) {
 }
 
 std::string content(const std::string& file) {
-  std::ostringstream text;
-  text << std::ifstream(file).rdbuf();
-  return text.str();
+  std::ifstream stream(file);
+  return {std::istreambuf_iterator<char>(stream), {}};
 }
 
 }  // namespace
@@ -132,9 +131,8 @@ void world::expect_text(const std::string& actual, const std::string& wanted) {
             wanted_lines.end());
   for (std::size_t i = 0; i < std::min(lines.size(), wanted_lines.size()); ++i) {
     const std::string& pattern = wanted_lines[i];
-    if (pattern.ends_with(": *") && lines[i].starts_with(pattern.substr(0, pattern.size() - 1))) {
+    if (pattern.ends_with(": *") && lines[i].starts_with(pattern.substr(0, pattern.size() - 1)))
       lines[i] = pattern;
-    }
   }
   EXPECT_EQ(lines, wanted_lines);
 }
