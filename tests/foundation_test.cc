@@ -78,6 +78,7 @@ TEST_F(foundation, a_version_text_is_parsed_up_to_a_number_too_large) {
       {"02016az", "2016 az -1 -1"},
       {"2147483647z.2147483647.02147483647", "2147483647 z 2147483647 2147483647"},
       {"2147483648b", "stoi\n1 x 1 1"},
+      {"2017b.2147483648", "stoi\n2017 b 1 1"},
       {"2017b.2.2147483648", "stoi\n2017 b 2 1"}};
   for (const auto& [text, fields] : table) EXPECT_EQ(parsed(text), fields);
 }
