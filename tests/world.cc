@@ -47,6 +47,7 @@ void world::SetUp() {
   root_ = name;
   fs::copy(KELVANE_RUNTIME, root_, fs::copy_options::recursive);
   if (const std::string shared = KELVANE_SHARED_DIRECTORY; !shared.empty()) {
+    // In a namespace of the test's own: the machine must not see the mount, nor keep it.
     ASSERT_EQ(::unshare(CLONE_NEWNS), 0);
     ASSERT_EQ(::mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr), 0);
     ASSERT_EQ(::mount(shared.c_str(), (root_ + shared).c_str(), nullptr, MS_REC | MS_BIND, nullptr),

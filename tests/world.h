@@ -27,7 +27,7 @@ class world : public testing::Test {
   // Makes what the entries say, and the directories on the way; a link replaces what is there.
   static void build(const std::string& entries);
 
-  // The entries below `top`, in order, without those below `except`.
+  // The entries below `top`, in order, without `except` and what is below; empty without `top`.
   static std::string listing(const std::string& top, const std::string& except = "");
 
   // What an operation wrote on standard error, without the name before each line, then what it
@@ -39,7 +39,7 @@ class world : public testing::Test {
   static void expect_text(const std::string& actual, const std::string& wanted);
 
   // Runs the program on what `before` adds to the world, and expects its warnings, "status N" if N
-  // is not 0, and what /var/db then holds besides the downloads, which must not have changed.
+  // is not 0, and what /var/db then holds besides the downloads; these and /usr must not change.
   static void expect_run(const std::string& before, const std::string& after,
                          const char* file = __builtin_FILE(), int line = __builtin_LINE());
 
