@@ -41,7 +41,7 @@ class orv_dataset {
   bool compatible_schema(const orv_dataset& other) const;
 
   // Makes the store's links select this data set: the zoneinfo link first, then the ICU link.
-  // Throws the int error number of a link that could not be created, and leaves the rest undone.
+  // Throws as the components' activate() does, after their warnings, and leaves the rest undone.
   void activate() const;
 
   // Whether this version is newer than that of `other`; an equal one is not.

@@ -19,9 +19,10 @@ class orv_dataset_component {
   // Whether this component can stand in for `other`.
   virtual bool compatible_schema(const orv_dataset_component& other) const = 0;
 
-  // Makes the store's link of this kind select this component's data, by removing the link and
-  // creating it anew. Throws the int error number of a link that could not be created, after its
-  // warning; the old link is gone then.
+  // Makes the store's link of this kind select this component's data: removes the link, then
+  // creates it anew. A link that cannot be removed is warned about and no more. Throws the int
+  // error number of a link that cannot be created, after its warning; the old link is gone then,
+  // unless it could not be removed.
   virtual void activate() const = 0;
 
  protected:

@@ -9,8 +9,7 @@
 
 namespace kelvane {
 
-// The store's link to the active ICU directory. There is none while the system partition's is
-// active.
+// The store's link to the active ICU directory. A reset to the system partition's leaves none.
 inline constexpr char icu_link[] = "/var/db/timezone/icutz";
 
 // Where that link was in an older layout of the store.
@@ -30,10 +29,11 @@ class orv_icu final : public orv_dataset_component {
   // system partition. The schema is:
   //
   //  1. On the system partition, the first word of the file "icutzformat.txt", or empty.
-  //  2. In a release, the 44l of the first file icutz44l.dat that the directory lists, in no
-  //     particular order. It must lie directly in the directory, be a regular file, not a link, and
-  //     be readable by others, since all users' programs read it. Where there is none, the schema
-  //     is empty, after the warning "No ICU schema found for DIRECTORY".
+  //  2. In a release, what stands for 44l in the name of the first file like icutz44l.dat that the
+  //     directory, links followed, lists, in no particular order. It must lie directly in the
+  //     directory, be a regular file, not a link, and be readable by others, since all users'
+  //     programs read it. Where there is none, the schema is empty, after the warning "No ICU
+  //     schema found for DIRECTORY".
   //
   // Throws an int error number when the search cannot begin, after the warning "tz_icu::initialize:
   // fts_open of ICU_DIRECTORY failed, ERROR".

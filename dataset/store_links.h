@@ -26,8 +26,10 @@ std::string latest_dataset_path();
 // and dataset_path_from_link() do; a missing link counts as an empty target.
 std::string current_dataset_path();
 
-// The directory of the data set that a zoneinfo link with this target selects. Warns "Bad zoneinfo
-// link TARGET" and throws the int -1, which is no error number, for a target that selects none.
+// The directory of the data set that a zoneinfo link with this target selects: what is before the
+// last slash of a text below `downloads_directory`, or empty for exactly the system partition's
+// zoneinfo directory. Warns "Bad zoneinfo link TARGET" and throws the int -1, which is no error
+// number, for a target that selects none.
 //
 // Examples: "/usr/share/zoneinfo.default" gives the empty string, and
 // "/var/db/timezone/tz/2022b.1.1/zoneinfo" gives "/var/db/timezone/tz/2022b.1.1".

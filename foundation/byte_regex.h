@@ -16,6 +16,7 @@ namespace kelvane {
 // of 256 bytes for each bracket, ten times the cost of building a pattern. Named classes
 // ([:alpha:], \d) and collating elements are not supported.
 struct byte_traits {
+  // What a pattern makes for itself; a std::locale would be a copy of the process's.
   struct classic_locale : std::locale {
     classic_locale() : std::locale(classic()) {}
   };

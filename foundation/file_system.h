@@ -1,8 +1,10 @@
-// File-system operations: the only places that call access, unlink, readlink and symlink.
+// File-system operations: the only places that call access, unlink, readlink and symlink. What must
+// take an empty directory away as well calls remove(3), which is std::remove.
 //
 // Each is one system call. A path goes to the system unchanged: nothing is normalised or joined. An
 // operation that fails writes its warning, which names the path, and then throws the error number
-// of the failed call as a plain int. Absence is no failure where it is ordinary, as stated below.
+// of the failed call as a plain int. Absence (ENOENT) is no failure where it is ordinary, as stated
+// below.
 
 #ifndef KELVANE_FOUNDATION_FILE_SYSTEM_H_
 #define KELVANE_FOUNDATION_FILE_SYSTEM_H_

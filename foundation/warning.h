@@ -12,8 +12,8 @@ namespace kelvane {
 //     to the stream, so that lines of several programs in one log do not interleave.
 //  2. The current error number is the same before and after, so that a second warning about the
 //     same failure ends in the same text.
-//  3. A line that cannot be written is lost, and nothing else happens. Only a full pipe that nobody
-//     reads holds the run.
+//  3. A line that cannot be written is lost, and nothing else happens. Only a reader that does not
+//     read, as of a full pipe, holds the run.
 //
 // Example: with errno at EISDIR, warn("remove: could not remove %s", "/var/db/icutz") writes
 //   kelvane: remove: could not remove /var/db/icutz: Is a directory
@@ -21,7 +21,8 @@ namespace kelvane {
 // The texts of the messages are fixed, oddities included: do not tidy them.
 [[gnu::format(printf, 1, 2)]] void warn(const char* format, ...);
 
-// Makes warn() keep its guarantees, however the process was started: called once, first of all.
+// Makes warn() keep its guarantees, however the process was started: called once, first of all. It
+// ignores SIGPIPE and SIGXFSZ, buffers standard error fully and sets the program's short name.
 void prepare_warnings();
 
 }  // namespace kelvane

@@ -36,7 +36,7 @@ int main() {
   kelvane::prepare_process();
   kelvane::prepare_store();
   kelvane::migrate_legacy_icutz();
-  std::remove(obsolete_icu);
+  std::remove(obsolete_icu);  // Stage 3.
   const bool selected = completes(kelvane::select_dataset, "Could not reset to system partition");
   const bool repaired = completes(kelvane::repair_localtime, "Could not reset localtime link");
   return selected && repaired ? EXIT_SUCCESS : EXIT_FAILURE;

@@ -14,6 +14,7 @@ void migrate_legacy_icutz() {
   } catch (...) {
     warn("Could not migrate /var/db/icutz to /var/db/timezone/icutz");
   }
+  // Migrated or not: nothing reads the old link any more.
   try {
     if (exists(legacy_icu_link)) remove(legacy_icu_link);
   } catch (...) {

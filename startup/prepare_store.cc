@@ -10,6 +10,8 @@
 namespace kelvane {
 namespace {
 
+constexpr char store_directory[] = "/var/db/timezone/";
+
 // This system has no data-protection classes: once a file system is mounted, its files stay
 // readable and writable in every lock state, which is all that is wanted. The fcntl(2) command for
 // it on systems that have them is not sent: its number is free here, and may mean anything
@@ -26,7 +28,7 @@ void set_protection_class(const std::string& path) {
 
 void prepare_store() {
   try {
-    set_protection_class("/var/db/timezone/");
+    set_protection_class(store_directory);
     set_protection_class(downloads_directory);
   } catch (...) {
     // Memory has run out; the stages that need the store will say so.

@@ -5,9 +5,9 @@
 
 namespace kelvane {
 
-// Puts the directories of the store and of its downloads, where they exist, into the
-// data-protection class whose files stay accessible in every lock state of the device. Whatever
-// fails is ignored.
+// Opens and closes the directories of the store and of its downloads. On a system that has
+// data-protection classes, this is where both would get the one whose files stay accessible in
+// every lock state of the device. Whatever fails is ignored. Throws nothing.
 void prepare_store();
 
 }  // namespace kelvane

@@ -11,8 +11,9 @@ namespace kelvane {
 //  2. In a target that begins with "/usr/share/zoneinfo", that text is replaced by
 //     "/var/db/timezone/zoneinfo", after the warning "Correcting localtime link to TARGET" and
 //     provided that the result exists.
-//  3. Anything else, be it a missing link, a file or a failure of 1 or 2, is replaced by a link to
-//     the default zone: "localtime link invalid; resetting to America/Los_Angeles".
+//  3. Anything else, be it a missing link, a file, an empty directory or a failure of 1 or 2, is
+//     replaced by a link to the default zone: "localtime link invalid; resetting to
+//     America/Los_Angeles".
 //
 // Beginnings are compared as text: whatever character comes next, and no target is resolved.
 // Throws the int error number when the link to the default zone cannot be created, after its

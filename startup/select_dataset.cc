@@ -56,6 +56,7 @@ void consider_update(const orv_dataset& update, const orv_dataset& system,
 
 void select_or_throw() {
   const orv_dataset system;
+  // Before the current links: where it cannot be read, one reset follows, without their message.
   const std::string update_path = latest_dataset_path();
   const orv_dataset current(current_path_or_reset());
   const bool usable = is_usable(current, system);

@@ -8,8 +8,8 @@ namespace kelvane {
 // Makes the store's zoneinfo and ICU links select a data set that is compatible with the system
 // partition's:
 //
-//  1. A zoneinfo link that selects no data set is reset to the system partition, after the warning
-//     "Invalid current symlinks; resetting to system partition".
+//  1. A zoneinfo link that selects no data set, or cannot be read, is reset to the system
+//     partition, after the warning "Invalid current symlinks; resetting to system partition".
 //  2. So is one that selects a data set which is incompatible with the system partition's, or
 //     older: "Symlink points at data incompatible with installed system".
 //  3. The newest download, if there is one, is then activated when it is compatible with the system
@@ -17,8 +17,8 @@ namespace kelvane {
 //     rejected in step 2 or not; it may be older than the system partition's.
 //     "/var/db/timezone/TZVersionDiffRecord" then holds the version texts of the data set active
 //     before and of the download, as in 2022a.1.0_2023c.1.0. A record that cannot be written is no
-//     failure. A download that is not activated is reported: "New update not compatible or older
-//     version: UPDATE vs. CURRENT".
+//     failure, and a named pipe in its place stays as it is. A download that is not activated is
+//     reported: "New update not compatible or older version: UPDATE vs. CURRENT".
 //  4. Where any of this fails, the links are reset after the warning "Unable to locate data;
 //     resetting to system partition".
 //
