@@ -11,9 +11,8 @@ namespace kelvane {
 //     find room even where the process may have three descriptors; and the one that it writes, open
 //     alone, never takes the number of a closed standard error, to receive the warnings.
 //  2. Where memory runs out and no handler can catch it, be it an exception that cannot be raised
-//  or
-//     a SIGSEGV in the C library, the run ends with status 1 after the warning "Could not go on".
-//     So does a fault of the program.
+//     or a SIGSEGV in the C library, the run ends with status 1 after the warning "Could not go
+//     on". So does a fault of the program.
 //
 // It calls prepare_warnings().
 void prepare_process();
