@@ -5,6 +5,7 @@
 #include <cerrno>
 #include <cstddef>
 #include <cstdlib>
+#include <cstring>
 
 // NOLINTBEGIN(readability-identifier-naming): the linker's names.
 extern "C" {
@@ -18,10 +19,8 @@ static const char* number = nullptr;
 
 static bool fails() {
   if (number == nullptr) return false;
-  char* end = nullptr;
-  const long failing = std::strtol(number, &end, 10);
-  ++count;
-  if (count != failing && (count < failing || *end != '+')) return false;
+  const long beyond = ++count - std::atol(number);
+  if (beyond < 0 || (beyond > 0 && std::strchr(number, '+') == nullptr)) return false;
   errno = ENOMEM;
   return true;
 }
