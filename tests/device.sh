@@ -37,14 +37,15 @@ on() {
     "icutz -> /var/db/timezone/tz/$1/icutz"
 }
 
-# snapshot ROOT: $store, the store's links and record as text, and $data, everything that no run
-# may change, with sizes and times.
+# snapshot ROOT: $store, the store's links and files as text, $record, what the record holds, and
+# $data, everything that no run may change, with sizes and times.
 snapshot() {
   local all
-  all=$(cd "$1" && find usr var/db/timezone/tz -printf '%p %y %l %s %T@\n' && echo ---- &&
-    find var/db -path var/db/timezone/tz -prune -o ! -type d -printf '/%p -> %l\n' | sort)
-  data=${all%%----*} store=${all#*----$'\n'}
-  record=
+  all=$'\n'$(cd "$1" && find usr var/db -regextype egrep \
+    -regex '(usr|var/db/timezone/tz)(/.*)?' -printf 'data %p %y %l %s %T@\n' -o \
+    ! -type d -printf '/%p -> %l\n' | LC_ALL=C sort)
+  store=${all%%$'\ndata'*} record=
+  data=${all#"$store"} store=${store#$'\n'}
   [[ ! -f $1/var/db/timezone/TZVersionDiffRecord ]] ||
-    record=$(<"$1/var/db/timezone/TZVersionDiffRecord")
+    read -r -d '' record <"$1/var/db/timezone/TZVersionDiffRecord" || true
 }
