@@ -7,7 +7,7 @@ exec </dev/null
 umask 022
 unset TZ TZDIR
 export LC_ALL=C DEBIAN_FRONTEND=noninteractive
-CMAKE_BUILD_PARALLEL_LEVEL=$(nproc)
+: "${CMAKE_BUILD_PARALLEL_LEVEL:=$(nproc)}"
 export CMAKE_BUILD_PARALLEL_LEVEL
 
 fail() {

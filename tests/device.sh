@@ -4,6 +4,8 @@
 
 set -euo pipefail
 umask 022
+# An ordinary user's has no chroot(8). Not /sbin, where the program is in a throw-away root.
+export PATH=/usr/sbin:$PATH
 ((EUID == 0)) || UNPRIVILEGED=yes exec unshare --map-root-user bash "$0" "$@"
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
@@ -47,5 +49,5 @@ snapshot() {
   store=${all%%$'\ndata'*} record=
   data=${all#"$store"} store=${store#$'\n'}
   [[ ! -f $1/var/db/timezone/TZVersionDiffRecord ]] ||
-    read -r -d '' record <"$1/var/db/timezone/TZVersionDiffRecord" || true
+    IFS= read -r -d '' record <"$1/var/db/timezone/TZVersionDiffRecord" || true
 }
