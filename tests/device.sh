@@ -43,6 +43,7 @@ on() {
 # $data, everything that no run may change, with sizes and times.
 snapshot() {
   local all
+  # In C's order the store's lines, which begin with a slash, come first.
   all=$'\n'$(cd "$1" && find usr var/db -regextype egrep \
     -regex '(usr|var/db/timezone/tz)(/.*)?' -printf 'data %p %y %l %s %T@\n' -o \
     ! -type d -printf '/%p -> %l\n' | LC_ALL=C sort)
