@@ -13,9 +13,10 @@ namespace kelvane {
 // The descriptor of what stands at a path, closed at the end of the scope.
 class descriptor {
  public:
-  // Opens `path`, links followed, with the flags of open(2) and O_CLOEXEC; reports nothing.
+  // Opens `path`, links followed, with the flags of open(2) and O_CLOEXEC. With O_CREAT a missing
+  // file is made with the permissions that the umask leaves of 0666. Reports nothing.
   descriptor(const std::string& path, int flags)
-      : number(::open(path.c_str(), flags | O_CLOEXEC)) {}
+      : number(::open(path.c_str(), flags | O_CLOEXEC, 0666)) {}
   ~descriptor() {
     if (number != -1) ::close(number);
   }

@@ -4,6 +4,7 @@
 
 #include <cerrno>
 #include <cstddef>
+#include <cstdio>
 
 #include "foundation/warning.h"
 
@@ -18,6 +19,8 @@ void remove(const std::string& path) {
   warn("remove: could not remove %s", path.c_str());
   throw error;
 }
+
+void discard(const std::string& path) { std::remove(path.c_str()); }
 
 std::string read_symlink(const std::string& path) {
   char target[1024];

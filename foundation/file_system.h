@@ -1,10 +1,10 @@
-// File-system operations: the only places that call access, unlink, readlink and symlink. What must
-// take an empty directory away as well calls remove(3), which is std::remove.
+// File-system operations: the only places that call access, unlink, readlink, symlink and remove(3).
 //
-// Each is one system call. A path goes to the system unchanged: nothing is normalised or joined. An
-// operation that fails writes its warning, which names the path, and then throws the error number
-// of the failed call as a plain int. Absence (ENOENT) is no failure where it is ordinary, as stated
-// below.
+// Each is one operation of the system. A path goes to it unchanged: nothing is normalised or
+// joined. remove(), read_symlink() and create_symlink() write a warning when they fail, which names
+// the path, and then throw the error number of the failed call as a plain int. Absence (ENOENT) is
+// no failure where it is ordinary, as stated below. A file where the path wants a directory
+// (ENOTDIR) is no absence, but a failure.
 
 #ifndef KELVANE_FOUNDATION_FILE_SYSTEM_H_
 #define KELVANE_FOUNDATION_FILE_SYSTEM_H_
@@ -19,7 +19,14 @@ bool exists(const std::string& path);
 
 // Removes the file or the link (never its target) at `path`; a missing path is no failure.
 // Warns "remove: could not remove PATH", as for a directory, which stays.
+//
+// Call it by its full name outside this namespace: with a using directive, a string literal would
+// go to the C library's remove(3) without a word.
 void remove(const std::string& path);
+
+// Removes the file, the link or the empty directory at `path`, as remove(3) does; where that fails,
+// what is there stays. Never warns, never throws.
+void discard(const std::string& path);
 
 // The text that the link at `path` holds, cut to its first 1,024 bytes, or the empty string when
 // nothing is at `path`. Warns "read_symlink: PATH", as for a file or a directory (EINVAL).

@@ -12,26 +12,23 @@ namespace {
 
 constexpr char store_directory[] = "/var/db/timezone/";
 
-// This system has no data-protection classes: once a file system is mounted, its files stay
-// readable and writable in every lock state, which is all that is wanted. The fcntl(2) command for
-// it on systems that have them is not sent: its number is free here, and may mean anything
-// tomorrow.
-void keep_accessible_in_every_lock_state(const descriptor& /*directory*/) {}
-
 void set_protection_class(const std::string& path) {
+  // This system has no data-protection classes: once a file system is mounted, its files stay
+  // readable and writable in every lock state, which is all that is wanted. The fcntl(2) command
+  // for it on systems that have them is not sent: its number is free here, and may mean anything
+  // tomorrow.
   const descriptor directory(path, O_RDONLY);
-  if (directory.number == -1) return;
-  keep_accessible_in_every_lock_state(directory);
 }
 
 }  // namespace
 
 void prepare_store() {
-  try {
-    set_protection_class(store_directory);
-    set_protection_class(downloads_directory);
-  } catch (...) {
-    // Memory has run out; the stages that need the store will say so.
+  for (const char* const directory : {store_directory, downloads_directory}) {
+    try {
+      set_protection_class(directory);
+    } catch (...) {
+      // Memory has run out; the stages that need the store will say so.
+    }
   }
 }
 

@@ -1,6 +1,5 @@
 #include "startup/repair_localtime.h"
 
-#include <cstdio>
 #include <string>
 #include <string_view>
 
@@ -15,10 +14,9 @@ constexpr char localtime_link[] = "/var/db/timezone/localtime";
 constexpr std::string_view legacy_prefix = "/usr/share/zoneinfo";
 constexpr char default_zone[] = "America/Los_Angeles";
 
-// remove(3), because an empty directory must give way as well.
 void replace_link(const std::string& target) {
   const std::string link = localtime_link;  // Before the removal: memory may run out.
-  std::remove(link.c_str());
+  discard(link);
   create_symlink(target, link);
 }
 

@@ -1,12 +1,13 @@
 #include "startup/select_dataset.h"
 
-#include <sys/stat.h>
+#include <fcntl.h>
+#include <unistd.h>
 
-#include <fstream>
 #include <string>
 
 #include "dataset/orv_dataset.h"
 #include "dataset/store_links.h"
+#include "foundation/descriptor.h"
 #include "foundation/warning.h"
 
 namespace kelvane {
@@ -29,16 +30,12 @@ bool is_usable(const orv_dataset& current, const orv_dataset& system) {
 }
 
 void write_version_difference(const orv_dataset& active, const orv_dataset& update) {
-  // A named pipe in the record's place would hold the run until somebody reads it.
-  struct stat status = {};
-  if (::stat(version_difference_record, &status) == 0 && S_ISFIFO(status.st_mode)) return;
-  // All memory is taken before the old record is gone.
+  // All memory is taken before the old record is emptied.
   const std::string text = active.get_version_string() + "_" + update.get_version_string();
-  char buffer[256];
-  std::ofstream record;
-  record.rdbuf()->pubsetbuf(buffer, sizeof buffer);
-  record.open(version_difference_record, std::ios::out | std::ios::trunc);
-  record << text;
+  // Without O_NONBLOCK a named pipe in the record's place would hold the run until somebody reads.
+  const descriptor record(version_difference_record, O_WRONLY | O_CREAT | O_TRUNC | O_NONBLOCK);
+  if (record.number == -1) return;
+  [[maybe_unused]] const ssize_t written = ::write(record.number, text.data(), text.size());
 }
 
 // `current` and not `active` is what an update is measured against: a rejected data set's version
@@ -56,7 +53,7 @@ void consider_update(const orv_dataset& update, const orv_dataset& system,
 
 void select_or_throw() {
   const orv_dataset system;
-  // Before the current links: where it cannot be read, one reset follows, without their message.
+  // Before the zoneinfo link, which is not even read where this one is unreadable.
   const std::string update_path = latest_dataset_path();
   const orv_dataset current(current_path_or_reset());
   const bool usable = is_usable(current, system);
