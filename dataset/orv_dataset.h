@@ -16,20 +16,23 @@ namespace kelvane {
 // version text.
 inline constexpr char downloads_directory[] = "/var/db/timezone/tz/";
 
-// Whether `path` goes on after `downloads_directory`.
+// Whether `path` begins with `downloads_directory` and is longer.
 bool is_below_downloads(const std::string& path);
 
 // A data set, named by its directory: the empty string for the system partition, otherwise
-// "/var/db/timezone/tz/" and the version text. Not changed once it is constructed.
+// `downloads_directory` and the version text. No operation changes it; copies share the components.
 class orv_dataset {
  public:
   // The system partition's data set; warns and throws as the next one does.
   orv_dataset();
 
-  // The data set in `directory`. A version text that does not parse is warned about and counts as
-  // older than every version. Warns "orv_dataset::create_components: bad path DIRECTORY" and throws
-  // std::invalid_argument for any other directory; throws std::out_of_range for a version number
-  // that is too large, and whatever its components' constructors throw.
+  // The data set in `directory`, which is the empty string, or `downloads_directory` and any text:
+  // "x/y" and "2022b/" count as version texts too. One that does not parse is warned about, as
+  // tz_version::parse() does, and is older than every version.
+  //
+  // For any other directory, warns "orv_dataset::create_components: bad path DIRECTORY" and throws
+  // std::invalid_argument. Throws std::out_of_range for a version number that is too large, and
+  // whatever the components' constructors throw.
   explicit orv_dataset(const std::string& directory);
 
   // The version text as found, for messages and the record: 2022b.1.1 for
@@ -37,7 +40,9 @@ class orv_dataset {
   // 2022a. Never empty.
   std::string get_version_string() const;
 
-  // Whether each component can stand in for the one at the same position in `other`.
+  // Whether each component can stand in for its counterpart in `other`, the one at the same
+  // position; false where one data set has more components than the other. Stops at the first that
+  // cannot.
   bool compatible_schema(const orv_dataset& other) const;
 
   // Makes the store's links select this data set: the zoneinfo link first, then the ICU link.

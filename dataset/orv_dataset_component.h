@@ -9,8 +9,8 @@ namespace kelvane {
 
 // One kind of data of a data set, with the store's fixed link to it. Immutable once constructed.
 //
-// There is no virtual destructor, and none that a user of this interface could call: a component is
-// created as its concrete type, through std::make_shared, and the handle destroys it as that type.
+// There is no virtual destructor, and none that a user could call. So a handle to a component must
+// know the concrete type: make it with std::make_shared of that type, then convert it.
 class orv_dataset_component {
  public:
   orv_dataset_component(const orv_dataset_component&) = delete;
@@ -19,10 +19,10 @@ class orv_dataset_component {
   // Whether this component can stand in for `other`.
   virtual bool compatible_schema(const orv_dataset_component& other) const = 0;
 
-  // Makes the store's link of this kind select this component's data: removes the link, then
-  // creates it anew. A link that cannot be removed is warned about and no more. Throws the int
-  // error number of a link that cannot be created, after its warning; the old link is gone then,
-  // unless it could not be removed.
+  // Makes the store's link of this kind select this component's data: removes the old link, then
+  // creates the new one, if this component needs one. A link that cannot be removed is warned about
+  // and no more. Throws the int error number of a link that cannot be created, after its warning;
+  // the old link is gone then, unless it could not be removed.
   virtual void activate() const = 0;
 
  protected:

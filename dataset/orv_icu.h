@@ -32,20 +32,20 @@ class orv_icu final : public orv_dataset_component {
   //  2. In a release, what stands for 44l in the name of the first file like icutz44l.dat that the
   //     directory, links followed, lists, in no particular order. It must lie directly in the
   //     directory, be a regular file, not a link, and be readable by others, since all users'
-  //     programs read it. Where there is none, the schema is empty, after the warning "No ICU
-  //     schema found for DIRECTORY".
+  //     programs read it. Where there is none, be it that the ICU directory is missing or cannot be
+  //     read, the schema is empty, after the warning "No ICU schema found for DIRECTORY".
   //
-  // Throws an int error number when the search cannot begin, after the warning "tz_icu::initialize:
-  // fts_open of ICU_DIRECTORY failed, ERROR".
+  // Throws the int error number when memory is short or the path too long for a search, after the
+  // warning "tz_icu::initialize: fts_open of ICU_DIRECTORY failed, ERROR".
   explicit orv_icu(const std::string& directory);
 
   // Whether `other` is an ICU directory of the same schema, the empty one included. Warns
   // "orv_icu::compatible_schema: could not dynamic_cast other component" for another kind.
   bool compatible_schema(const orv_dataset_component& other) const override;
 
-  // Makes `icu_link` hold this directory, or only removes it for the system partition's, and
-  // removes `legacy_icu_link`. A link that cannot be removed is reported with "unlink of ICU
-  // softlink failed", after the warning of remove(); the second is kept when the first one is.
+  // Removes `icu_link`, then `legacy_icu_link`; then, unless this is the system partition's, makes
+  // `icu_link` hold this directory. A link that cannot be removed is reported with "unlink of ICU
+  // softlink failed", after the warning of remove(); if it is `icu_link`, the other stays as well.
   void activate() const override;
 
  private:

@@ -26,13 +26,13 @@ std::string latest_dataset_path();
 // and dataset_path_from_link() do; a missing link counts as an empty target.
 std::string current_dataset_path();
 
-// The directory of the data set that a zoneinfo link with this target selects: what is before the
-// last slash of a text below `downloads_directory`, or empty for exactly the system partition's
-// zoneinfo directory. Warns "Bad zoneinfo link TARGET" and throws the int -1, which is no error
-// number, for a target that selects none.
+// The directory of the data set that a zoneinfo link with this target selects:
 //
-// Examples: "/usr/share/zoneinfo.default" gives the empty string, and
-// "/var/db/timezone/tz/2022b.1.1/zoneinfo" gives "/var/db/timezone/tz/2022b.1.1".
+//  1. For exactly the system partition's zoneinfo directory, the empty string.
+//  2. For `downloads_directory`, a name and a slash, with anything after it, the target up to its
+//     last slash: "/var/db/timezone/tz/2022b.1.1/zoneinfo" gives "/var/db/timezone/tz/2022b.1.1".
+//  3. For anything else, such as "/var/db/timezone/tz/2022b" or "/var/db/timezone/tz//zoneinfo",
+//     none: warns "Bad zoneinfo link TARGET" and throws the int -1, which is no error number.
 std::string dataset_path_from_link(const std::string& target);
 
 }  // namespace kelvane

@@ -1,10 +1,9 @@
-// File-system operations: the only places that call access, unlink, readlink, symlink and remove(3).
+// File-system operations: the only places that call access, unlink, readlink, symlink or remove(3).
 //
-// Each is one operation of the system. A path goes to it unchanged: nothing is normalised or
-// joined. remove(), read_symlink() and create_symlink() write a warning when they fail, which names
-// the path, and then throw the error number of the failed call as a plain int. Absence (ENOENT) is
-// no failure where it is ordinary, as stated below. A file where the path wants a directory
-// (ENOTDIR) is no absence, but a failure.
+// A path goes to the system unchanged: nothing is normalised or joined. remove(), read_symlink()
+// and create_symlink() warn when their call fails, naming the path, and then throw its error number
+// as a plain int. Absence (ENOENT) is no failure where it is ordinary, as stated below; a file
+// where the path wants a directory (ENOTDIR) is one.
 
 #ifndef KELVANE_FOUNDATION_FILE_SYSTEM_H_
 #define KELVANE_FOUNDATION_FILE_SYSTEM_H_

@@ -8,18 +8,17 @@
 
 namespace kelvane {
 
-// The parsed form of a version text such as 2016a.1.0: the release's name, which is a year and one
-// or more lower-case letters, and up to two numeric sub-versions. It cannot be turned back into
-// text: 02016a.01 and 2016a.1 are equal.
+// The parsed form of a version text such as 2016a.1.0: digits for the year, one or more of the
+// letters a to z, then up to two sub-versions, each a dot and digits; nothing before, between or
+// after. It cannot be turned back into text: 02016a.01 and 2016a.1 are equal.
 struct tz_version {
-  // -1, empty, -1 and -1 together are the unset value; a single -1 stands for an absent
-  // sub-version.
+  // After a text was parsed, -1 in `major` or `minor` means that it has no such sub-version.
   std::int32_t year = -1;
   std::string letters;
   std::int32_t major = -1;
   std::int32_t minor = -1;
 
-  // The unset value, which is older than every version.
+  // The unset value, as initialised above; it is older than every version.
   tz_version() = default;
 
   // As parse(text).
@@ -33,7 +32,7 @@ struct tz_version {
   // Example: 2016a.1 gives year 2016, letters a, major 1 and minor -1.
   void parse(const std::string& text);
 
-  // Whether all four fields are equal.
+  // Whether all four fields are equal; != follows from it.
   bool operator==(const tz_version&) const = default;
 };
 

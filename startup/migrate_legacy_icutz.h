@@ -5,10 +5,15 @@
 
 namespace kelvane {
 
-// Where "/var/db/icutz" leads to something, gives "/var/db/timezone/icutz" the same target, unless
-// that leads to something itself, and removes the old link. Failures are warned about, "Could not
-// migrate /var/db/icutz to /var/db/timezone/icutz" and "Could not remove /var/db/icutz", and stop
-// neither step. Throws nothing.
+// Where "/var/db/icutz" leads to something:
+//
+//  1. Gives "/var/db/timezone/icutz" the same target, unless that leads to something itself. Warns
+//     "Could not migrate /var/db/icutz to /var/db/timezone/icutz" where this fails, as for a file
+//     in the old link's place.
+//  2. Removes the old link, or the file in its place, whatever became of step 1. Warns "Could not
+//     remove /var/db/icutz" where this fails, as for a directory.
+//
+// Throws nothing.
 void migrate_legacy_icutz();
 
 }  // namespace kelvane

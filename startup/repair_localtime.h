@@ -17,7 +17,7 @@ namespace kelvane {
 //
 // Beginnings are compared as text: whatever character comes next, and no target is resolved.
 // Throws the int error number when the link to the default zone cannot be created, after its
-// warning.
+// warning; std::bad_alloc when memory runs out before.
 void repair_localtime();
 
 }  // namespace kelvane
