@@ -25,7 +25,8 @@ using fts_handle = std::unique_ptr<FTS, fts_closer>;
 fts_handle open_traversal(const std::string& root) {
   std::string root_argument = root;
   char* const roots[] = {root_argument.data(), nullptr};
-  fts_handle traversal(::fts_open(roots, FTS_COMFOLLOW | FTS_PHYSICAL | FTS_XDEV, nullptr));
+  fts_handle traversal(
+      ::fts_open(roots, FTS_COMFOLLOW | FTS_NOCHDIR | FTS_PHYSICAL | FTS_XDEV, nullptr));
   if (traversal == nullptr) {
     const int error = errno;
     warn("tz_icu::initialize: fts_open of %s failed, %s", root.c_str(), std::strerror(error));
