@@ -42,9 +42,8 @@ void world::SetUp() {
     ASSERT_EQ(::unshare(CLONE_NEWUSER), 0) << "no unprivileged user namespaces";
     std::ofstream("/proc/self/uid_map") << "0 " << user << " 1";
   }
-  char name[] = "/tmp/kelvane-test-XXXXXX";
-  ASSERT_NE(::mkdtemp(name), nullptr);
-  root_ = name;
+  root_ = fs::temp_directory_path() / "kelvane-test-XXXXXX";
+  ASSERT_NE(::mkdtemp(root_.data()), nullptr);
   fs::copy(KELVANE_RUNTIME, root_, fs::copy_options::recursive);
   if (const std::string shared = KELVANE_SHARED_DIRECTORY; !shared.empty()) {
     // In a namespace of the test's own: the machine must not see the mount, nor keep it.
@@ -54,7 +53,7 @@ void world::SetUp() {
               0);
   }
   outer_root_ = ::open("/", O_RDONLY | O_CLOEXEC);
-  ASSERT_TRUE(::chroot(name) == 0 && ::chdir("/") == 0);
+  ASSERT_TRUE(::chroot(root_.c_str()) == 0 && ::chdir("/") == 0);
 }
 
 void world::TearDown() {
@@ -143,12 +142,20 @@ void world::expect_run(const std::string& before, const std::string& after, cons
   const testing::ScopedTrace trace(file, line, "this run");
   build(before);
   const std::string untouched = listing("/usr") + listing("/var/db/timezone/tz");
-  char name[] = "/sbin/any-name", ignored[] = "--ignored";
+  char ignored[] = "--ignored";
+#ifdef KELVANE_EMULATOR
+  char emulator[] = KELVANE_EMULATOR, program[] = "/sbin/kelvane";
+  const char* const executable = emulator;
+  char* const arguments[] = {emulator, program, ignored, nullptr};
+#else
+  char name[] = "/sbin/any-name";
+  const char* const executable = "/sbin/kelvane";
   char* const arguments[] = {name, ignored, nullptr};
+#endif
   int status = -1;
   std::string actual = outcome([&] {
     pid_t child = -1;
-    ::posix_spawn(&child, "/sbin/kelvane", nullptr, nullptr, arguments, environ);
+    ::posix_spawn(&child, executable, nullptr, nullptr, arguments, environ);
     ::waitpid(child, &status, 0);
   });
   EXPECT_TRUE(WIFEXITED(status));
