@@ -16,17 +16,22 @@
 namespace kelvane {
 namespace {
 
+// Otherwise a large file, or one from after 2038, could be neither opened nor seen.
+static_assert(sizeof(off_t) >= 8 && sizeof(time_t) >= 8);
+
 struct fts_closer {
   void operator()(FTS* traversal) const { ::fts_close(traversal); }
 };
 using fts_handle = std::unique_ptr<FTS, fts_closer>;
 
 // The entries come in the directory's own order, the root followed if it is a link, others not.
+// FTS_NOCHDIR, because glibc checks a directory that it enters with a stat(2) of its own, whose
+// times have 32 bits on 32-bit machines: one from after 2038 could not be read.
 fts_handle open_traversal(const std::string& root) {
   std::string root_argument = root;
   char* const roots[] = {root_argument.data(), nullptr};
-  fts_handle traversal(
-      ::fts_open(roots, FTS_COMFOLLOW | FTS_NOCHDIR | FTS_PHYSICAL | FTS_XDEV, nullptr));
+  constexpr int options = FTS_COMFOLLOW | FTS_NOCHDIR | FTS_PHYSICAL | FTS_XDEV;
+  fts_handle traversal(::fts_open(roots, options, nullptr));
   if (traversal == nullptr) {
     const int error = errno;
     warn("tz_icu::initialize: fts_open of %s failed, %s", root.c_str(), std::strerror(error));
