@@ -12,7 +12,9 @@
 #include <gtest/gtest.h>
 #include <poll.h>
 #include <sched.h>
+#if __has_include(<seccomp.h>)
 #include <seccomp.h>
+#endif
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -122,6 +124,7 @@ class device : public testing::Test {
     ::dup2(saved, STDERR_FILENO);
     ::close(saved);
     for (const std::string& line : lines_of(content("/stderr"))) {
+      if (line.starts_with("LLVM Profile")) continue;  // What counts coverage had a call fail.
       EXPECT_TRUE(line.starts_with("kelvane: ")) << line;
       result += line.substr(9, line.rfind(": ") - 9) + "\n";
     }
@@ -139,6 +142,7 @@ class device : public testing::Test {
         // A sanitizer's own calls at the end of a run fail as well.
         if (watch) ::setenv("ASAN_OPTIONS", "abort_on_error=1:detect_leaks=0", 1);
         prepare();
+        ::execl("/sbin/emulator", "emulator", "/sbin/kelvane", nullptr);  // Of another machine.
         ::execl("/sbin/kelvane", "any-name", "--ignored", nullptr);
         ::_exit(127);
       }
@@ -154,7 +158,8 @@ class device : public testing::Test {
   // Does `start` in a thread whose calls, and those of the program that it starts, the kernel holds
   // until they are answered here. `watch` decides about the program's, from where main() ignores
   // SIGPIPE. Nothing else may allocate here: the thread may hold the lock.
-  static void watch_calls(const watcher& watch, const action& start) {
+  static void watch_calls([[maybe_unused]] const watcher& watch, const action& start) {
+#ifdef SCMP_ACT_NOTIFY
     const int sigaction = seccomp_syscall_resolve_name("rt_sigaction");
     const scmp_filter_ctx filter = seccomp_init(SCMP_ACT_NOTIFY);
     // The C library aborts where these fail.
@@ -189,6 +194,9 @@ class device : public testing::Test {
     seccomp_release(filter);
     // Closes the listener, without which the library would not ask for another.
     seccomp_reset(nullptr, 0);
+#else
+    start();
+#endif
   }
 };
 
