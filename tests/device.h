@@ -162,8 +162,13 @@ class device : public testing::Test {
 #ifdef SCMP_ACT_NOTIFY
     const int sigaction = seccomp_syscall_resolve_name("rt_sigaction");
     const scmp_filter_ctx filter = seccomp_init(SCMP_ACT_NOTIFY);
-    // The C library aborts where these fail.
-    for (const char* name : {"execve", "exit", "exit_group", "futex"})
+    // The C library, or a sanitizer, aborts where these fail.
+    for (const char* name :
+         {"execve", "exit", "exit_group", "futex",
+#ifdef __SANITIZE_ADDRESS__
+          "mmap", "munmap", "madvise", "brk", "sigaltstack", "rt_sigprocmask", "gettid", "tgkill"
+#endif
+         })
       seccomp_rule_add(filter, SCMP_ACT_ALLOW, seccomp_syscall_resolve_name(name), 0);
     seccomp_notif* call = nullptr;
     seccomp_notif_resp* answer = nullptr;
