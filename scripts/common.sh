@@ -5,6 +5,8 @@ set -euo pipefail
 cd "$(dirname "$(realpath "${BASH_SOURCE[0]}")")/.."
 exec </dev/null
 umask 022
+# An ordinary user's has no chroot(8).
+export PATH=$PATH:/usr/sbin
 unset TZ TZDIR
 export LC_ALL=C DEBIAN_FRONTEND=noninteractive
 : "${CMAKE_BUILD_PARALLEL_LEVEL:=$(nproc)}"
@@ -39,14 +41,15 @@ need_packages() {
   quietly "${install[@]}"
 }
 
-# A throw-away root is entered by root, or by a user who is root in a namespace of their own.
+# Throw-away roots lie under build/, where programs may run. Root enters one, or a user who is root
+# in a namespace of their own; containers may withhold either.
 need_throw_away_roots() {
-  ((EUID == 0)) || unshare --map-root-user true 2>/dev/null ||
-    fail "an ordinary user gets no user namespace here (unshare --map-root-user); run it as root"
+  { mkdir -p build 2>/dev/null && [[ -w build ]]; } || fail "this checkout is read-only; copy it"
+  in_root / true 2>/dev/null && return
+  ((EUID == 0)) && fail "root may not call chroot here; the container needs CAP_SYS_CHROOT"
+  fail "an ordinary user gets no user namespace here (unshare --map-root-user); run it as root"
 }
 
 in_root() { # root directory, command
-  local namespace=()
-  ((EUID == 0)) || namespace=(--map-root-user)
-  unshare "${namespace[@]}" --root="$1" "${@:2}"
+  if ((EUID == 0)); then chroot "$@"; else unshare --map-root-user chroot "$@"; fi
 }
