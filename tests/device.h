@@ -12,7 +12,7 @@
 #include <gtest/gtest.h>
 #include <poll.h>
 #include <sched.h>
-#if __has_include(<seccomp.h>)
+#ifdef KELVANE_SECCOMP
 #include <seccomp.h>
 #endif
 #include <sys/stat.h>
