@@ -44,7 +44,7 @@ need_packages() {
 # Throw-away roots lie under build/, where programs may run. Root enters one, or a user who is root
 # in a namespace of their own; containers may withhold either.
 need_throw_away_roots() {
-  { mkdir -p build 2>/dev/null && [[ -w build ]]; } || fail "this checkout is read-only; copy it"
+  { mkdir -p build 2>/dev/null && [[ -w build ]]; } || fail "this checkout is not writable; copy it"
   in_root / true 2>/dev/null && return
   ((EUID == 0)) && fail "root may not call chroot here; the container needs CAP_SYS_CHROOT"
   fail "an ordinary user gets no user namespace here (unshare --map-root-user); run it as root"
