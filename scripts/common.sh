@@ -17,6 +17,8 @@ fail() {
   exit 1
 }
 
+[[ $PWD != *\"* ]] || fail "CMake cannot build below a directory with \" in its name; rename it"
+
 # Runs a command and shows its output only where it fails, which ends the script.
 quietly() {
   local output
