@@ -17,6 +17,8 @@ fail() {
   exit 1
 }
 
+[[ $PWD != *\"* ]] || fail "CMake cannot build below a directory with \" in its name; rename it"
+
 # Runs a command and shows its output only where it fails, which ends the script.
 quietly() {
   local output
@@ -44,7 +46,7 @@ need_packages() {
 # Throw-away roots lie under build/, where programs may run. Root enters one, or a user who is root
 # in a namespace of their own; containers may withhold either.
 need_throw_away_roots() {
-  { mkdir -p build 2>/dev/null && [[ -w build ]]; } || fail "this checkout is read-only; copy it"
+  { mkdir -p build 2>/dev/null && [[ -w build ]]; } || fail "this checkout is not writable; copy it"
   in_root / true 2>/dev/null && return
   ((EUID == 0)) && fail "root may not call chroot here; the container needs CAP_SYS_CHROOT"
   fail "an ordinary user gets no user namespace here (unshare --map-root-user); run it as root"
