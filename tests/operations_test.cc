@@ -14,13 +14,12 @@ namespace {
 using operations = device;
 
 TEST_F(operations, file_operations_change_nothing_where_they_fail) {
-  const std::string held = "/s/dead -> /missing\n/s/dir/f = x\n/s/link -> no//target/\n";
+  const std::string held = "/s/dead -> /missing\n/s/dir/f = x\n/s/link -> no//\n";
   build(held);
   const std::pair<action, std::string> table[] = {
       {[] { remove("/s/dir/f/x"); }, "remove: could not remove /s/dir/f/x\nint 20\n"},
       {[] { read_symlink("/s/dir/f/x"); }, "read_symlink: /s/dir/f/x\nint 20\n"},
-      {[] { create_symlink("no//target/", "/s/link"); },
-       "create_symlink: from /s/link to no//target/\nint 17\n"},
+      {[] { create_symlink("no//", "/s/link"); }, "create_symlink: from /s/link to no//\nint 17\n"},
       {[] { discard("/s/dir"), create_symlink("..//x/", "/s/new"); }, ""}};
   for (const auto& [operation, wanted] : table) EXPECT_EQ(outcome(operation), wanted);
   EXPECT_EQ(listing(), text(held + "/s/new -> ..//x/\n/var/db/"));
@@ -37,7 +36,7 @@ TEST_F(operations, a_warning_ends_in_the_error_and_is_lost_where_it_cannot_be_wr
 }
 
 TEST_F(operations, the_first_word_lies_between_white_space_of_any_kind) {
-  const std::string gap = " \t\n\v\f\r", high = "2016a\xa0\x85", pages(9000, 'w');
+  const std::string gap = " \t\n\v\f\r", high = "2016a\xa0\x85", pages(8192, 'w');
   const std::pair<std::string, std::string> table[] = {
       {"x", "x"}, {gap + "2023c", "2023c"}, {std::string(9000, ' ') + high + "\rx", high},
       {gap, ""},  {"a\v2023d" + gap, "a"},  {pages + "\t" + pages, pages}};
@@ -99,12 +98,11 @@ TEST_F(operations, a_link_target_names_a_data_set_or_is_bad) {
               "Bad zoneinfo link " + target + "\nint -1\n");
 }
 
-TEST_F(operations, a_version_text_is_the_directory_name_or_made_from_the_system_partition) {
-  build("/usr/share/zoneinfo.default/+VERSION = 2022a\n~/tz/2022b.1.1/icutz/icutz44l.dat = data");
-  const orv_dataset system, update(tz + "2022b.1.1");
-  EXPECT_EQ(system.get_version_string() + update.get_version_string(), "2022a.1.02022b.1.1");
-  EXPECT_TRUE(update.is_newer_than(system) && !update.is_newer_than(update));
-  EXPECT_TRUE(system.same_path(orv_dataset("")) && !update.same_path(system));
+TEST_F(operations, a_data_set_is_named_by_its_directory) {
+  build("/usr/share/zoneinfo.default/+VERSION = 2022a\n~/tz/2022a.1.0/icutz/icutz44l.dat = data");
+  const orv_dataset system, download(tz + "2022a.1.0");
+  EXPECT_EQ(system.get_version_string(), download.get_version_string());
+  EXPECT_TRUE(system.same_path(orv_dataset("")) && !download.same_path(system));
   const std::string bad = "orv_dataset::create_components: bad path ";
   for (const std::string path : {"/var/db/timezone/tz/", "//var/db/timezone/tz/a", "tz/2022b",
                                  "/var/db/timezone/TZ/a", "/usr/share/zoneinfo.default"})
@@ -112,28 +110,26 @@ TEST_F(operations, a_version_text_is_the_directory_name_or_made_from_the_system_
 }
 
 TEST_F(operations, the_schema_is_in_the_name_of_a_readable_file_directly_in_the_directory) {
-  static constexpr char icu[] = "/var/db/timezone/tz/1a/icutz",
-                        data[] = "/var/db/timezone/tz/1a/icutz/icutz44l.dat";
+  static const std::string icu = tz + "1a/icutz", data = icu + "/icutz44l.dat";
   // Where sizes and times have 32 bits, large files and late times could not be looked at.
   static constexpr timespec times[] = {{2208988800, 0}, {2208988800, 0}};
   const auto same = [] { return orv_icu(tz + "1a").compatible_schema(orv_icu()); };
-  const auto expect = [&](const std::string& schema, const std::string& entry,
-                          const action& change) {
+  const auto expect = [&](const std::string& schema, const std::string& entry, const action& edit) {
     build("/usr/share/icu/icutzformat.txt = " + schema + "\n~/tz/1a/icutz/" + entry);
-    change();
+    edit();
     EXPECT_EQ(outcome([&] { EXPECT_TRUE(same()) << entry; }),
               schema != "" ? "" : "No ICU schema found for " + tz + "1a\n");
   };
   expect("007e", "icutz007e.dat = ", [] {});
   expect("1b", "icutz1b.dat = ", [] {});
-  expect("44l", "icutz44l.dat = ", [] { ASSERT_EQ(::truncate(data, 3LL << 30), 0); });
-  expect("44l", "icutz44l.dat = ", [] { ASSERT_EQ(::utimensat(0, data, times, 0), 0); });
-  expect("44l", "icutz44l.dat = ", [] { ASSERT_EQ(::utimensat(0, icu, times, 0), 0); });
+  expect("44l", "icutz44l.dat = ", [] { ASSERT_EQ(::truncate(data.c_str(), 3LL << 30), 0); });
+  expect("44l", "icutz44l.dat = ", [] { ASSERT_EQ(::utimensat(0, data.c_str(), times, 0), 0); });
+  expect("44l", "icutz44l.dat = ", [] { ASSERT_EQ(::utimensat(0, icu.c_str(), times, 0), 0); });
   expect("44l", "icutz44l.dat = ", [] { fs::rename(icu, "/s"), fs::create_symlink("/s", icu); });
   build("/usr/share/icu/icutzformat.txt = 044l\n~/tz/1a/icutz/icutz44l.dat = ");
   EXPECT_FALSE(same());
-  expect("", "icutz44l.dat = ", [] { ASSERT_EQ(::chmod(data, 0660), 0); });
-  expect("", "icutz44l.dat = ", [] { ASSERT_EQ(::unlink(data) + ::mkfifo(data, 0644), 0); });
+  expect("", "icutz44l.dat = ", [] { ASSERT_EQ(::chmod(data.c_str(), 0660), 0); });
+  expect("", "icutz44l.dat = ", [] { fs::remove(data), ::mkfifo(data.c_str(), 0644); });
   expect("", "icutz44l.dat = ", [] { fs::remove_all(icu); });
   for (const char* entry :
        {"icutz44l.dat -> /usr/share/icu/icutzformat.txt",
