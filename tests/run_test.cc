@@ -44,9 +44,9 @@ const std::string no_zone = "localtime link invalid; resetting to America/Los_An
 const std::string no_schema = "No ICU schema found for ~/tz/";
 const std::string no_system = "create_symlink: from ~/zoneinfo to /usr/share/zoneinfo.default\n";
 const std::string no_icu_link = "create_symlink: from ~/icutz to ~/tz/2023c.1.0/icutz\n";
-const std::string icu_failed = "unlink of ICU softlink failed\n";
-const std::string kept_icu = "remove: could not remove ~/icutz\n" + icu_failed;
-const std::string kept_legacy = "remove: could not remove /var/db/icutz\n";
+const std::string icu_fails = "unlink of ICU softlink failed\n";
+const std::string kept_icu = "remove: could not remove ~/icutz\n" + icu_fails;
+const std::string kept_old = "remove: could not remove /var/db/icutz\n";
 const std::string bad_opt = "Bad zoneinfo link /opt\n";
 const std::string no_reset = "Could not reset to system partition\n";
 const std::string no_default =
@@ -60,7 +60,7 @@ void limit(decltype(RLIMIT_AS) resource, rlim_t value) {
 
 struct run : device {
   struct situation {
-    std::string before, says, changes;
+    std::string before, after;  // What is said, then what changes.
     watcher watch = {};
     action prepare = [] {};
   };
@@ -69,7 +69,7 @@ struct run : device {
     for (const situation& row : table) {
       const std::string before = data + base + row.before;
       build(before);
-      EXPECT_EQ(boot(row.watch, row.prepare), text(before + "\n" + row.says + row.changes))
+      EXPECT_EQ(boot(row.watch, row.prepare), text(before + "\n" + row.after))
           << "in row " << &row - table.data();
     }
   }
@@ -78,47 +78,45 @@ struct run : device {
 TEST_F(run, the_newest_usable_data_set_is_selected) {
   const std::string c = "2023c.1.0", version = "/usr/share/zoneinfo.default/+VERSION = ";
   const std::string than_c = " vs. 2023c.1.0\n", bad = no_version(".1.0");
-  expect(
-      latest + paris + record("longer than what is written now"),
-      {{on_system, "", activated},
-       {on("2022b"), "", on(c) + record("2022b_2023c.1.0")},
-       {version + "2023c\n" + on(c), not_newer + c + than_c, ""},
-       {on(c) + newest + "2022b", not_newer + "2022b" + than_c, ""},
-       {on_system + newest + "2022z", not_newer + "2022z vs. 2022a.1.0\n", ""},
-       // A rejected data set is still what an update is compared with.
-       {version + "2024b\n" + on("2022b"), rejected, on(c) + record("2024b.1.0_2023c.1.0")},
-       {on("2022z"), rejected, activated},
-       {version + "2024b\n" + on(c), rejected + not_newer + c + than_c, reset},
-       {on("2022z") + newest + "2022b", rejected + not_newer + "2022b vs. 2022z\n", reset},
-       // Names that are no version, and numbers too large.
-       {version + "\n" + on_system, bad + bad, on(c) + record(".1.0_2023c.1.0")},
-       {on(c) + newest + "2022b/", no_version("2022b/") + not_newer + "2022b/" + than_c, ""},
-       {on(c) + newest + "x", no_version("x") + no_schema + "x\n" + not_newer + "x" + than_c, ""},
-       {on("99999999999a"), unable, reset},
-       {on("2022b") + newest + "2023c.99999999999", unable, reset}});
+  expect(latest + paris + record("longer than what is written now"),
+         {{on_system, activated},
+          {on("2022b"), on(c) + record("2022b_2023c.1.0")},
+          {version + "2023c\n" + on(c), not_newer + c + than_c},
+          {on(c) + newest + "2022b", not_newer + "2022b" + than_c},
+          {on_system + newest + "2022z", not_newer + "2022z vs. 2022a.1.0\n"},
+          // A rejected data set is still what an update is compared with.
+          {version + "2024b\n" + on("2022b"), rejected + on(c) + record("2024b.1.0_2023c.1.0")},
+          {on("2022z"), rejected + activated},
+          {version + "2024b\n" + on(c), rejected + not_newer + c + than_c + reset},
+          {on("2022z") + newest + "2022b", rejected + not_newer + "2022b vs. 2022z\n" + reset},
+          // Names that are no version, and numbers too large.
+          {version + "\n" + on_system, bad + bad + on(c) + record(".1.0_2023c.1.0")},
+          {on(c) + newest + "2022b/", no_version("2022b/") + not_newer + "2022b/" + than_c},
+          {on(c) + newest + "x", no_version("x") + no_schema + "x\n" + not_newer + "x" + than_c},
+          {on("99999999999a"), unable + reset},
+          {on("2022b") + newest + "2023c.99999999999", unable + reset}});
 }
 
 TEST_F(run, what_stands_in_a_links_place_is_replaced_or_reported) {
   const std::string bad_path = "orv_dataset::create_components: bad path /opt/a\n";
-  const std::string no_schemas = "/usr/share/icu/icutzformat.txt = \n" + newest + "2026a";
-  expect(
-      paris,
-      {{"", "Bad zoneinfo link \n" + invalid, on_system},
-       {opt + latest, bad_opt + invalid, activated},
-       {"~/zoneinfo = file", "read_symlink: ~/zoneinfo\n" + invalid, on_system},
-       {on("2022b") + "~/tz_latest -> /opt/a", bad_path + unable, reset},
-       // Nothing is said of the zoneinfo link, which is not even read.
-       {opt + "~/tz_latest = file", "read_symlink: ~/tz_latest\n" + unable, on_system},
-       {updatable + legacy_icu + "/a\n~/icutz/", kept_icu + no_icu_link + unable + kept_icu, ""},
-       {updatable + "~/TZVersionDiffRecord/", "", on("2023c.1.0")},
-       {on_system + no_schemas, no_schema + "2026a\n", on("2026a") + record("2022a.1.0_2026a")}});
+  const std::string bare = "/usr/share/icu/icutzformat.txt = \n" + newest + "2026a";
+  expect(paris,
+         {{"", "Bad zoneinfo link \n" + invalid + on_system},
+          {opt + latest, bad_opt + invalid + activated},
+          {"~/zoneinfo = file", "read_symlink: ~/zoneinfo\n" + invalid + on_system},
+          {on("2022b") + "~/tz_latest -> /opt/a", bad_path + unable + reset},
+          // Nothing is said of the zoneinfo link, which is not even read.
+          {opt + "~/tz_latest = file", "read_symlink: ~/tz_latest\n" + unable + on_system},
+          {updatable + legacy_icu + "/a\n~/icutz/", kept_icu + no_icu_link + unable + kept_icu},
+          {updatable + "~/TZVersionDiffRecord/", on("2023c.1.0")},
+          {on_system + bare, no_schema + "2026a\n" + on("2026a") + record("2022a.1.0_2026a")}});
 }
 
 TEST_F(run, what_fails_for_good_is_said_and_the_rest_goes_on) {
   const std::string bad = no_version(".1.0"), kept = "remove: could not remove ~/zoneinfo\n";
   const std::string fails = kept + "Unlink of zoneinfo softlink failed\n" + no_system;
   const std::string twice = invalid + fails + unable + fails + no_reset + no_zone + "status 1\n";
-  expect("", {{"~/zoneinfo/", "read_symlink: ~/zoneinfo\n" + twice, los_angeles}});
+  expect("", {{"~/zoneinfo/", "read_symlink: ~/zoneinfo\n" + twice + los_angeles}});
   build("");
   EXPECT_EQ(boot(), text(bad + "Bad zoneinfo link \n" + invalid + bad + no_system + unable + bad +
                          no_system + no_reset + no_default + "/var/db/"));
@@ -129,32 +127,31 @@ TEST_F(run, the_legacy_icu_link_is_carried_over_unless_there_is_a_new_one) {
   const std::string failed = "Could not migrate /var/db/icutz to ~/icutz\n";
   const std::string no_usr = "create_symlink: from ~/icutz to /usr\n";
   expect(on_system + paris,
-         {{legacy_icu + "../../usr", "", gone + "~/icutz -> ../../usr"},
-          {"/var/db/icu = file", "", "- /var/db/icu"},
-          {legacy_icu + "/usr\n~/icutz -> /var\n/var/db/icu/", "", gone + "- /var/db/icu/"},
-          {legacy_icu + "/usr\n~/icutz -> /a", no_usr + failed, gone},
-          {legacy_icu + "/a\n/var/db/icu/full/", "", ""},
-          {"/var/db/icutz = file", not_read + failed, gone},
-          {"/var/db/icutz/", not_read + failed + kept_legacy + "Could not remove /var/db/icutz\n",
-           ""}});
+         {{legacy_icu + "../../usr", gone + "~/icutz -> ../../usr"},
+          {"/var/db/icu = file", "- /var/db/icu"},
+          {legacy_icu + "/usr\n~/icutz -> /var\n/var/db/icu/", gone + "- /var/db/icu/"},
+          {legacy_icu + "/usr\n~/icutz -> /a", no_usr + failed + gone},
+          {legacy_icu + "/a\n/var/db/icu/full/", ""},
+          {"/var/db/icutz = file", not_read + failed + gone},
+          {"/var/db/icutz/", not_read + failed + kept_old + "Could not remove /var/db/icutz\n"}});
 }
 
 TEST_F(run, the_localtime_link_is_made_to_lead_through_the_store) {
   const std::string link = "~/localtime -> ", not_read = "read_symlink: ~/localtime\n";
   const std::string corrected = "Correcting localtime link to ~/zoneinfo";
   expect(on_system,
-         {{"", no_zone, los_angeles},
-          {link + "~/zoneinfo/No/Zone", "", ""},
-          {link + "~/zoneinfoX", "", ""},
-          {link + "~/zoneinf", no_zone, los_angeles},
-          {link + "../zoneinfo/Europe/Paris", no_zone, los_angeles},
-          {link + "/usr/share/zoneinf", no_zone, los_angeles},
-          {link + "/usr/share/zoneinfo", corrected + "\n", link + "~/zoneinfo"},
-          {link + "/usr/share/zoneinfo/No/Zone", corrected + "/No/Zone\n" + no_zone, los_angeles},
-          {old_zone, corrected + "/Europe/Paris\n", paris},
-          {"~/localtime = file", not_read + no_zone, los_angeles},
-          {"~/localtime/", not_read + no_zone, los_angeles + "- ~/localtime/"},
-          {"~/localtime/full/", not_read + no_default, ""}});
+         {{"", no_zone + los_angeles},
+          {link + "~/zoneinfo/No/Zone", ""},
+          {link + "~/zoneinfoX", ""},
+          {link + "~/zoneinf", no_zone + los_angeles},
+          {link + "../zoneinfo/Europe/Paris", no_zone + los_angeles},
+          {link + "/usr/share/zoneinf", no_zone + los_angeles},
+          {link + "/usr/share/zoneinfo", corrected + "\n" + link + "~/zoneinfo"},
+          {link + "/usr/share/zoneinfo/No/Zone", corrected + "/No/Zone\n" + no_zone + los_angeles},
+          {old_zone, corrected + "/Europe/Paris\n" + paris},
+          {"~/localtime = file", not_read + no_zone + los_angeles},
+          {"~/localtime/", not_read + no_zone + los_angeles + "- ~/localtime/"},
+          {"~/localtime/full/", not_read + no_default}});
 }
 
 TEST_F(run, surroundings_change_nothing_else) {
@@ -163,22 +160,22 @@ TEST_F(run, surroundings_change_nothing_else) {
   ASSERT_EQ(::pipe2(ends, O_CLOEXEC), 0);
   ::close(ends[0]);
   const action pipe = [] { ::mkfifo("/var/db/timezone/TZVersionDiffRecord", 0); };
-  const std::string after = los_angeles + activated;
+  const std::string after = los_angeles + activated, said = no_zone + after;
   expect(updatable,
-         {{"", "", after, {}, [] { ::close(0), ::close(1), ::close(2); }},
-          {"", "", after, {}, [] { ::close(2); }},
+         {{"", after, {}, [] { ::close(0), ::close(1), ::close(2); }},
+          {"", after, {}, [] { ::close(2); }},
           // Standard error without a reader, then one that may not grow, like the record.
-          {"", "", after, {}, [&] { ::dup2(ends[1], 2); }},
-          {"", "", after + record(""), {}, [] { limit(RLIMIT_FSIZE, 0); }},
-          {"", no_zone, after, {}, [] { limit(RLIMIT_NOFILE, 4); }},
-          {"", no_zone, after + "- ~/TZVersionDiffRecord", {}, pipe},
-          {"", no_zone, after, {}, [] { limit(RLIMIT_STACK, 256 << 10); }},
+          {"", after, {}, [&] { ::dup2(ends[1], 2); }},
+          {"", after + record(""), {}, [] { limit(RLIMIT_FSIZE, 0); }},
+          {"", said, {}, [] { limit(RLIMIT_NOFILE, 4); }},
+          {"", said + "- ~/TZVersionDiffRecord", {}, pipe},
+          {"", said, {}, [] { limit(RLIMIT_STACK, 256 << 10); }},
 #ifndef __SANITIZE_ADDRESS__
-          {"", no_zone, after, {}, [] { limit(RLIMIT_AS, 8 << 20); }},
+          {"", said, {}, [] { limit(RLIMIT_AS, 8 << 20); }},
 #endif
-          {"", no_zone, after, {}, [] { ::umask(0777); }},
-          {"", no_zone, after, {}, [] { ::mkdir("/s", 0), fs::current_path("/s"), ::rmdir("/s"); }},
-          {"", no_zone, after, {}, [&] { ::execv("/sbin/kelvane", no_arguments); }}});
+          {"", said, {}, [] { ::umask(0777); }},
+          {"", said, {}, [] { ::mkdir("/s", 0), fs::current_path("/s"), ::rmdir("/s"); }},
+          {"", said, {}, [&] { ::execv("/sbin/kelvane", no_arguments); }}});
   EXPECT_EQ(fs::status("/var/db/timezone/TZVersionDiffRecord").permissions(), fs::perms(0644));
 }
 
@@ -222,16 +219,15 @@ struct disturbed_run : run {
 };
 
 TEST_F(disturbed_run, says_what_failed_and_goes_on) {
-  const std::string corrected = "Correcting localtime link to ~/zoneinfo/Europe/Paris\n";
+  const std::string corrects = "Correcting localtime link to ~/zoneinfo/Europe/Paris\n";
   const std::string no_paris = "create_symlink: from ~/localtime to ~/zoneinfo/Europe/Paris\n";
-  expect(
-      paris,
-      {{opt, bad_opt + invalid + no_system + unable, on_system, failing("symlink")},
-       {on("2022z"), rejected + no_system + unable, reset, failing("symlink")},
-       {updatable, no_icu_link + unable, "", failing("symlink", 2)},
-       {updatable + legacy_icu + "/a", kept_legacy + icu_failed, activated, failing("unlink", 4)},
-       {updatable, "", on("2023c.1.0") + record(""), failing("write")},
-       {on_system + old_zone, corrected + no_paris + no_zone, los_angeles, failing("symlink")}});
+  expect(paris,
+         {{opt, bad_opt + invalid + no_system + unable + on_system, failing("symlink")},
+          {on("2022z"), rejected + no_system + unable + reset, failing("symlink")},
+          {updatable, no_icu_link + unable, failing("symlink", 2)},
+          {updatable + legacy_icu + "/a", kept_old + icu_fails + activated, failing("unlink", 4)},
+          {updatable, on("2023c.1.0") + record(""), failing("write")},
+          {on_system + old_zone, corrects + no_paris + no_zone + los_angeles, failing("symlink")}});
 }
 
 TEST_F(disturbed_run, changes_links_in_an_order_and_writes_each_line_at_once) {
