@@ -66,8 +66,8 @@ TEST_F(operations, a_version_text_is_parsed_up_to_a_number_too_large) {
   for (const auto& [text, fields] : table) {
     tz_version version("1x.1.1");
     std::ostringstream result;
-    result << outcome([&] { version.parse(text); }) << version.year << " " << version.letters << " "
-           << version.major << " " << version.minor;
+    result << outcome([&, &input = text] { version.parse(input); }) << version.year << " "
+           << version.letters << " " << version.major << " " << version.minor;
     EXPECT_EQ(result.str(), fields);
   }
 }
