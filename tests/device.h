@@ -11,13 +11,10 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <poll.h>
-#include <sched.h>
 #ifdef KELVANE_SECCOMP
 #include <seccomp.h>
 #endif
-#include <sys/stat.h>
 #include <sys/wait.h>
-#include <unistd.h>
 
 #include <csignal>
 #include <filesystem>
@@ -26,9 +23,7 @@
 #include <future>
 #include <map>
 #include <sstream>
-#include <string>
 #include <thread>
-#include <vector>
 
 #include "foundation/warning.h"
 
@@ -62,8 +57,7 @@ class device : public testing::Test {
     return lines;
   }
 
-  // The messages, then the entries in order. A later entry takes the place of an earlier one of the
-  // same path, and "- PATH" removes it.
+  // The messages, then the entries in order: the last of each path, unless "- PATH" follows.
   static std::string text(const std::string& lines) {
     std::string result;
     std::map<std::string, std::string> entries;
@@ -103,8 +97,7 @@ class device : public testing::Test {
     return text(entries);
   }
   static std::string content(const std::string& file) {
-    std::ifstream stream(file);
-    return {std::istreambuf_iterator<char>(stream), {}};
+    return {std::istreambuf_iterator<char>(std::ifstream(file).rdbuf()), {}};
   }
 
   // What an operation wrote on standard error, without the program's name and the error text of
@@ -129,6 +122,12 @@ class device : public testing::Test {
       result += line.substr(9, line.rfind(": ") - 9) + "\n";
     }
     return result + thrown;
+  }
+
+  // What is said of a text that is no version.
+  static std::string no_version(const std::string& text) {
+    const std::string warning = "Cannot parse version string " + text;
+    return warning + ", results.size() = 0\n" + warning + "\n";
   }
 
   // Runs the program, after `prepare` in the new process: its outcome, "status N" or "signal N"
