@@ -26,13 +26,13 @@ class orv_dataset {
   // The system partition's data set; warns and throws as the next one does.
   orv_dataset();
 
-  // The data set in `directory`, which is the empty string, or `downloads_directory` and any text:
-  // "x/y" and "2022b/" count as version texts too. One that does not parse is warned about, as
+  // The data set in `directory`, which is the empty string, or `downloads_directory` and a text
+  // that is not empty, be it "x/y" or "2022b/". A text that is no version is warned about, as
   // tz_version::parse() does, and is older than every version.
   //
   // For any other directory, warns "orv_dataset::create_components: bad path DIRECTORY" and throws
-  // std::invalid_argument. Throws std::out_of_range for a version number that is too large, and
-  // whatever the components' constructors throw.
+  // std::invalid_argument("badpath"). Throws std::out_of_range for a version number that is too
+  // large, and whatever the components' constructors throw.
   explicit orv_dataset(const std::string& directory);
 
   // The version text as found, for messages and the record: 2022b.1.1 for

@@ -29,11 +29,11 @@ class orv_icu final : public orv_dataset_component {
   // system partition. The schema is:
   //
   //  1. On the system partition, the first word of the file "icutzformat.txt", or empty.
-  //  2. In a release, what stands for 44l in the name of the first file like icutz44l.dat that the
-  //     directory, links followed, lists, in no particular order. It must lie directly in the
-  //     directory, be a regular file, not a link, and be readable by others, since all users'
-  //     programs read it. Where there is none, be it that the ICU directory is missing or cannot be
-  //     read, the schema is empty, after the warning "No ICU schema found for DIRECTORY".
+  //  2. In a release, 44l for a file icutz44l.dat; of several such files, the first that the system
+  //     lists counts. It must lie directly in the ICU directory, which may be a link, be a regular
+  //     file, and be readable by others, since all users' programs read it. Where there is none, be
+  //     it that the ICU directory is missing or cannot be read, the schema is empty, after the
+  //     warning "No ICU schema found for DIRECTORY".
   //
   // Throws the int error number when memory is short or the path too long for a search, after the
   // warning "tz_icu::initialize: fts_open of ICU_DIRECTORY failed, ERROR".

@@ -29,7 +29,7 @@ std::string current_dataset_path();
 // The directory of the data set that a zoneinfo link with this target selects:
 //
 //  1. For exactly the system partition's zoneinfo directory, the empty string.
-//  2. For `downloads_directory`, a name and a slash, with anything after it, the target up to its
+//  2. For `downloads_directory` and a text with a slash after its first byte, the target up to its
 //     last slash: "/var/db/timezone/tz/2022b.1.1/zoneinfo" gives "/var/db/timezone/tz/2022b.1.1".
 //  3. For anything else, such as "/var/db/timezone/tz/2022b" or "/var/db/timezone/tz//zoneinfo",
 //     none: warns "Bad zoneinfo link TARGET" and throws the int -1, which is no error number.

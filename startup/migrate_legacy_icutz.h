@@ -13,7 +13,7 @@ namespace kelvane {
 //  2. Removes the old link, or the file in its place, whatever became of step 1. Warns "Could not
 //     remove /var/db/icutz" where this fails, as for a directory.
 //
-// Throws nothing.
+// Both warnings follow that of the call that failed. Throws nothing.
 void migrate_legacy_icutz();
 
 }  // namespace kelvane
