@@ -17,6 +17,7 @@
 #include <sys/wait.h>
 
 #include <csignal>
+#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <functional>
@@ -44,7 +45,7 @@ class device : public testing::Test {
       return ::chroot(KELVANE_ROOT) == 0 && ::chdir("/") == 0;
     }();
     ASSERT_TRUE(entered) << "chroot is not allowed here, nor in a user namespace";
-    ::umask(022);
+    ::umask(020);  // Unlike any mode that a program would ask for.
     prepare_warnings();
   }
 
@@ -110,6 +111,9 @@ class device : public testing::Test {
     try {
       operation();
     } catch (int error) {
+      // The last warning is about this error.
+      EXPECT_TRUE(error == -1 ||
+                  content("/stderr").ends_with(std::strerror(error) + std::string("\n")));
       thrown = "int " + std::to_string(error) + "\n";
     } catch (const std::logic_error& error) {
       thrown = typeid(error).name() + std::string(" ") + error.what() + "\n";
@@ -142,7 +146,7 @@ class device : public testing::Test {
         if (watch) ::setenv("ASAN_OPTIONS", "abort_on_error=1:detect_leaks=0", 1);
         prepare();
         ::execl("/sbin/emulator", "emulator", "/sbin/kelvane", nullptr);  // Of another machine.
-        ::execl("/sbin/kelvane", "any-name", "--ignored", nullptr);
+        ::execl("/sbin/kelvane", "any-name", "-n", "--version", nullptr);
         ::_exit(127);
       }
       ::waitpid(program, &status, 0);
