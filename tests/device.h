@@ -158,12 +158,10 @@ class device : public testing::Test {
   }
 
  private:
-  // Does `start` in a thread whose calls, and those of the program that it starts, the kernel holds
-  // until they are answered here. `watch` decides about the program's, from where main() ignores
-  // SIGPIPE. Nothing else may allocate here: the thread may hold the lock.
-  static void watch_calls([[maybe_unused]] const watcher& watch, const action& start) {
 #ifdef SCMP_ACT_NOTIFY
-    const int sigaction = seccomp_syscall_resolve_name("rt_sigaction");
+  // Does `start` in a thread whose calls, and those of the program that it starts, the kernel holds
+  // until they are answered.
+  static void watch_calls(const watcher& watch, const action& start) {
     const scmp_filter_ctx filter = seccomp_init(SCMP_ACT_NOTIFY);
     // The C library, or a sanitizer, aborts where these fail.
     for (const char* name :
@@ -181,31 +179,39 @@ class device : public testing::Test {
       loaded.set_value(seccomp_load(filter) == 0 ? seccomp_notify_fd(filter) : -1);
       start();
     });
-    pollfd listener = {loaded.get_future().get(), POLLIN, 0};
-    __u32 program = 0;
-    while (listener.fd != -1 && ::poll(&listener, 1, -1) == 1 && listener.revents == POLLIN) {
-      *call = {};  // The kernel asks for zeros.
-      if (seccomp_notify_receive(listener.fd, call) != 0) continue;
-      if (call->data.nr == sigaction && call->data.args[0] == SIGPIPE) program = call->pid;
-      *answer = {call->id, 0, 0, SECCOMP_USER_NOTIF_FLAG_CONTINUE};
-      if (call->pid == program) {
-        char* const name = seccomp_syscall_resolve_num_arch(call->data.arch, call->data.nr);
-        if (const int error = watch(name); error != 0) *answer = {call->id, 0, -error, 0};
-        // A brk that fails gives the end of the heap as it is, and no error number; 0 will do.
-        if (name == std::string("brk")) answer->error = 0;
-        std::free(name);
-      }
-      seccomp_notify_respond(listener.fd, answer);
-    }
+    answer_calls(loaded.get_future().get(), *call, *answer, watch);
     starter.join();
     seccomp_notify_free(call, answer);
     seccomp_release(filter);
     // Closes the listener, without which the library would not ask for another.
     seccomp_reset(nullptr, 0);
-#else
-    start();
-#endif
   }
+
+  // `watch` decides about the program's calls, from where main() ignores SIGPIPE. Nothing else may
+  // allocate here: the thread may hold the lock.
+  static void answer_calls(int fd, seccomp_notif& call, seccomp_notif_resp& answer,
+                           const watcher& watch) {
+    const int sigaction = seccomp_syscall_resolve_name("rt_sigaction");
+    __u32 program = 0;
+    pollfd listener = {fd, POLLIN, 0};
+    while (fd != -1 && ::poll(&listener, 1, -1) == 1 && listener.revents == POLLIN) {
+      call = {};  // The kernel asks for zeros.
+      if (seccomp_notify_receive(fd, &call) != 0) continue;
+      if (call.data.nr == sigaction && call.data.args[0] == SIGPIPE) program = call.pid;
+      answer = {call.id, 0, 0, SECCOMP_USER_NOTIF_FLAG_CONTINUE};
+      if (call.pid == program) {
+        char* const name = seccomp_syscall_resolve_num_arch(call.data.arch, call.data.nr);
+        if (const int error = watch(name); error != 0) answer = {call.id, 0, -error, 0};
+        // A brk that fails gives the end of the heap as it is, and no error number; 0 will do.
+        if (name == std::string("brk")) answer.error = 0;
+        std::free(name);
+      }
+      seccomp_notify_respond(fd, &answer);
+    }
+  }
+#else
+  static void watch_calls(const watcher&, const action& start) { start(); }
+#endif
 };
 
 }  // namespace kelvane
