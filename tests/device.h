@@ -187,11 +187,12 @@ class device : public testing::Test {
     seccomp_reset(nullptr, 0);
   }
 
+  inline static const int sigaction = seccomp_syscall_resolve_name("rt_sigaction");
+
   // `watch` decides about the program's calls, from where main() ignores SIGPIPE. Nothing else may
   // allocate here: the thread may hold the lock.
   static void answer_calls(int fd, seccomp_notif& call, seccomp_notif_resp& answer,
                            const watcher& watch) {
-    const int sigaction = seccomp_syscall_resolve_name("rt_sigaction");
     __u32 program = 0;
     pollfd listener = {fd, POLLIN, 0};
     while (fd != -1 && ::poll(&listener, 1, -1) == 1 && listener.revents == POLLIN) {
