@@ -39,9 +39,12 @@ class device : public testing::Test {
  protected:
   // Enters the root, as an ordinary user in a user namespace.
   void SetUp() override {
-    static const bool entered = [user = ::geteuid()] {
-      if (user != 0 && ::unshare(CLONE_NEWUSER) == 0)
+    static const bool entered = [user = ::geteuid(), group = ::getegid()] {
+      if (user != 0 && ::unshare(CLONE_NEWUSER) == 0) {
         std::ofstream("/proc/self/uid_map") << "0 " << user << " 1";
+        std::ofstream("/proc/self/setgroups") << "deny";
+        std::ofstream("/proc/self/gid_map") << "0 " << group << " 1";
+      }
       return ::chroot(KELVANE_ROOT) == 0 && ::chdir("/") == 0;
     }();
     ASSERT_TRUE(entered) << "chroot is not allowed here, nor in a user namespace";
@@ -136,15 +139,14 @@ class device : public testing::Test {
 
   // Runs the program, after `prepare` in the new process: its outcome, "status N" or "signal N"
   // where it did not exit with 0, and what the device then holds.
-  static std::string boot(
-      const watcher& watch = {}, const action& prepare = [] {}) {
+  static std::string boot(const watcher& watch = {}, const action& prepare = {}) {
     int status = -1;
     const auto start = [&] {
       const pid_t program = ::fork();
       if (program == 0) {
         // A sanitizer's own calls at the end of a run fail as well.
         if (watch) ::setenv("ASAN_OPTIONS", "abort_on_error=1:detect_leaks=0", 1);
-        prepare();
+        if (prepare) prepare();
         ::execl("/sbin/emulator", "emulator", "/sbin/kelvane", nullptr);  // Of another machine.
         ::execl("/sbin/kelvane", "any-name", "-n", "--version", nullptr);
         ::_exit(127);

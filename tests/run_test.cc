@@ -186,7 +186,7 @@ TEST_F(run, surroundings_change_nothing_else) {
           {"", said, {}, [] { ::mkdir("/s", 0), fs::current_path("/s"), ::rmdir("/s"); }},
           {"", said, {}, [&] { ::execv("/sbin/kelvane", no_arguments); }}});
   const fs::path written = "/var/db/timezone/TZVersionDiffRecord";
-  EXPECT_EQ(fs::status(written).permissions(), fs::perms(0646));
+  EXPECT_EQ(static_cast<int>(fs::status(written).permissions()), 0646);
   EXPECT_EQ(fs::file_size(written), 19u);
 }
 
