@@ -14,6 +14,7 @@ constexpr char localtime_link[] = "/var/db/timezone/localtime";
 constexpr std::string_view legacy_prefix = "/usr/share/zoneinfo";
 constexpr char default_zone[] = "America/Los_Angeles";
 
+// By discard(), because an empty directory must give way as well.
 void replace_link(const std::string& target) {
   const std::string link = localtime_link;  // Before the removal: memory may run out.
   discard(link);

@@ -45,11 +45,11 @@ class device : public testing::Test {
         std::ofstream("/proc/self/setgroups") << "deny";
         std::ofstream("/proc/self/gid_map") << "0 " << group << " 1";
       }
+      ::umask(020);  // Unlike any mode that a program would ask for.
+      prepare_warnings();
       return ::chroot(KELVANE_ROOT) == 0 && ::chdir("/") == 0;
     }();
     ASSERT_TRUE(entered) << "chroot is not allowed here, nor in a user namespace";
-    ::umask(020);  // Unlike any mode that a program would ask for.
-    prepare_warnings();
   }
 
   static std::vector<std::string> lines_of(std::string text) {

@@ -64,7 +64,7 @@ struct run : device {
   struct situation {
     std::string before, after;  // What is said, then what changes.
     watcher watch = {};
-    action prepare = [] {};
+    action prepare = {};
   };
 
   static void expect(const std::string& base, const std::vector<situation>& table) {
