@@ -5,7 +5,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <regex>
 
 #include "tests/device.h"
 
@@ -113,6 +112,8 @@ TEST_F(run, what_stands_in_a_links_place_is_replaced_or_reported) {
           {opt + "~/tz_latest = file", "read_symlink: ~/tz_latest\n" + unable + on_system},
           {updatable + legacy_icu + "/a\n~/icutz/", kept_icu + no_icu_link + unable + kept_icu},
           {updatable + "~/TZVersionDiffRecord/", on("2023c.1.0")},
+          {updatable + "~/TZVersionDiffRecord -> /s/r\n/s/",
+           on("2023c.1.0") + "- /s/\n/s/r = 2022a.1.0_2023c.1.0"},
           {on_system + bare, no_schema + "2026a\n" + on("2026a") + record("2022a.1.0_2026a")}});
 }
 
