@@ -1,7 +1,6 @@
 // The program as a whole: its warnings, its exit status and what it leaves.
 
 #include <sys/resource.h>
-#include <sys/socket.h>
 
 #include <algorithm>
 
@@ -9,7 +8,8 @@
 
 namespace kelvane {
 
-// The system partition and the downloads, which no run changes.
+// The system partition and the downloads, which no run changes. 2022z has another schema; what
+// 2023c.1.0 has besides its data file must not be read.
 const std::string data = R"(
     /usr/share/zoneinfo.default/+VERSION = 2022a
     /usr/share/zoneinfo.default/Europe/Paris = TZif
@@ -54,9 +54,7 @@ const std::string no_reset = invalid + fails + unable + fails + not_reset + "sta
 const std::string no_default = no_zone + no_link + "localtime to ~/zoneinfo/America/Los_Angeles\n" +
                                "Could not reset localtime link\nstatus 1\n- ~/localtime\n";
 
-using run = device;
-
-TEST_F(run, the_newest_usable_data_set_is_selected) {
+TEST_F(device, the_newest_usable_data_set_is_selected) {
   const std::string c = "2023c.1.0", than_c = " vs. 2023c.1.0\n", bad = no_version(".1.0");
   const std::string system = "/usr/share/zoneinfo.default/+VERSION", version = system + " = ";
   expect(usual + latest,
@@ -71,12 +69,11 @@ TEST_F(run, the_newest_usable_data_set_is_selected) {
           // Names that are no version, and numbers too large.
           {"- " + system, bad + bad + on(c) + record(".1.0_2023c.1.0")},
           {on(c) + newest + "2022b/", no_version("2022b/") + not_newer + "2022b/" + than_c},
-          {on("99999999999a"), unable + reset},
           {version + "99999999999a\n" + on(c), unable + not_reset + "status 1\n"},
           {on("2022b") + newest + "2023c.99999999999", unable + reset}});
 }
 
-TEST_F(run, what_stands_in_a_links_place_is_replaced_or_reported) {
+TEST_F(device, what_stands_in_a_links_place_is_replaced_or_reported) {
   const std::string bad_path = "orv_dataset::create_components: bad path tz/2022b\n";
   const std::string bare = "/usr/share/icu/icutzformat.txt = \n/usr/share/icu/icutz44l.dat = \n";
   const std::string kept_icu = kept + "~/icutz\nunlink of ICU softlink failed\n";
@@ -92,14 +89,14 @@ TEST_F(run, what_stands_in_a_links_place_is_replaced_or_reported) {
                  {bare + newest + "2026a", no_schema + on("2026a") + record("2022a.1.0_2026a")}});
 }
 
-TEST_F(run, what_fails_for_good_is_said_and_the_rest_goes_on) {
+TEST_F(device, what_fails_for_good_is_said_and_the_rest_goes_on) {
   const std::string bad = no_version(".1.0"), again = bad + no_system;
   expect(usual, {{"- ~/zoneinfo\n~/zoneinfo/\n~/icutz -> /a", unread + "~/zoneinfo\n" + no_reset}});
   expect("", {{"/var/db/",
                bad + bad_link + "\n" + invalid + again + unable + again + not_reset + no_default}});
 }
 
-TEST_F(run, the_legacy_icu_link_is_carried_over_unless_there_is_a_new_one) {
+TEST_F(device, the_legacy_icu_link_is_carried_over_unless_there_is_a_new_one) {
   const std::string gone = "- /var/db/icutz\n";
   const std::string failed = "Could not migrate /var/db/icutz to ~/icutz\n";
   expect(usual, {{legacy + "../../usr", gone + "~/icutz -> ../../usr"},
@@ -110,11 +107,10 @@ TEST_F(run, the_legacy_icu_link_is_carried_over_unless_there_is_a_new_one) {
                                         "/var/db/icutz\nCould not remove /var/db/icutz\n"}});
 }
 
-TEST_F(run, the_localtime_link_is_made_to_lead_through_the_store) {
+TEST_F(device, the_localtime_link_is_made_to_lead_through_the_store) {
   expect(data + on_system,
          {{zone + "~/zoneinfo", ""},
-          {zone + "~/zoneinfo/../No/Zone", ""},
-          {zone + "~/zoneinfoX", ""},
+          {zone + "~/zoneinfoX/../No/Zone", ""},
           {zone + "~/zoneinf", no_zone},
           {zone + "../../..~/zoneinfo/Europe/Paris", no_zone},
           {zone + "/usr/share/zoneinf", no_zone},
@@ -129,7 +125,7 @@ static void limit(decltype(RLIMIT_AS) resource, rlim_t value) {
   ::setrlimit(resource, &limits);
 }
 
-TEST_F(run, surroundings_change_nothing_else) {
+TEST_F(device, surroundings_change_nothing_else) {
   static constexpr char written[] = "/var/db/timezone/TZVersionDiffRecord";
   static constexpr char* no_arguments[] = {nullptr};
   static const rlim_t files = fs::exists("/sbin/emulator") ? 9 : 4;
@@ -138,7 +134,8 @@ TEST_F(run, surroundings_change_nothing_else) {
   expect(store, unsaid, {}, [] { ::close(0), ::close(1), ::close(2); });
   expect(store, unsaid, {}, [] { ::close(2); });
   // Standard error without a reader, then one that may not grow, like the record.
-  expect(store, unsaid, {}, [] { ::dup2(::socket(AF_INET, SOCK_STREAM, 0), 2); });
+  static int ends[2];
+  expect(store, unsaid, {}, [] { ::pipe(ends), ::close(ends[0]), ::dup2(ends[1], 2); });
   expect(store, {{"", los_angeles + activated + record("")}}, {}, [] { limit(RLIMIT_FSIZE, 0); });
   // ctest leaves its log open as 3; an emulator has descriptors of its own.
   expect(store, said, {}, [] { ::close(3), limit(RLIMIT_NOFILE, files); });
@@ -148,6 +145,7 @@ TEST_F(run, surroundings_change_nothing_else) {
   expect(store, said, {}, [] { ::mkdir("/cwd", 0), fs::current_path("/cwd"), ::rmdir("/cwd"); });
   expect(store, {{"", no_zone + on("2023c.1.0")}}, {}, [] { ::mkfifo(written, 0); });
   expect(store, said, {}, [] { ::execv("/sbin/kelvane", no_arguments); });
+  EXPECT_EQ(fs::status("/var/db/timezone").permissions(), fs::perms(0757));
   EXPECT_TRUE(fs::status(written).permissions() == fs::perms(0646) && fs::file_size(written) == 19);
 }
 
@@ -155,11 +153,13 @@ TEST_F(run, surroundings_change_nothing_else) {
 struct disturbed_run : device {
   void SetUp() override {
     device::SetUp();
-    if (seccomp_api_get() < 5) GTEST_SKIP() << "the kernel does not hand its system calls over";
+    bool watched = false;
+    watch_calls([&](const std::string&) { return watched = true, 0; }, prepare_warnings);
+    if (!watched) GTEST_SKIP() << "the system calls of a run cannot be watched here";
   }
 
-  // Lets the call of this number fail, of those whose names begin so, and all after it if asked;
-  // `failed` has their names.
+  // Lets the call of this number fail, of those whose names begin so, and all after it if asked.
+  // Their names are then in `failed`.
   std::string failed;
   watcher failing(const std::string& names, int number = 1, bool onward = false) {
     failed.clear();
@@ -194,7 +194,7 @@ TEST_F(disturbed_run, says_what_failed_and_goes_on) {
          failing("symlink|unlink|rmdir", 1, true));
 }
 
-TEST_F(disturbed_run, says_each_line_at_once_and_changes_links_in_an_order) {
+TEST_F(disturbed_run, says_each_line_at_once_and_changes_links_in_this_order) {
   std::string now = usual + on("2022z") + "- ~/icutz\n" + latest + old_paris + legacy +
                     "/usr\n/var/db/icu = file\n";
   build(now);
@@ -240,7 +240,8 @@ TEST_F(disturbed_run, leaves_what_the_next_run_puts_right) {
     std::vector<std::string> ends;
     for (std::size_t i = 0; i < states.size(); ++i) {
       build(states[i]);
-      const std::string first = boot(note), again = boot();
+      // A link made anew in a sound store would be lost.
+      const std::string first = boot(note), again = boot(failing("symlink"));
       EXPECT_EQ((first + again).find("status"), std::string::npos) << states[i];
       EXPECT_EQ(std::regex_replace(again, words, ""), std::regex_replace(first, words, ""));
       ends.push_back(std::regex_replace(listing(), varies, ""));
