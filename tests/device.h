@@ -168,13 +168,12 @@ struct device : testing::Test {
         seccomp_rule_add(filter, SCMP_ACT_ALLOW, seccomp_syscall_resolve_name(name.c_str()), 0);
     std::promise<int> loaded;
     std::thread starter([&] {
-      loaded.set_value(seccomp_load(filter) == 0 ? seccomp_notify_fd(filter) : -1);
+      loaded.set_value(seccomp_load(filter) == 0 ? seccomp_notify_fd(filter) : 1 << 30);
       start();
     });
-    // Nothing else may allocate here: the thread may hold the lock.
+    // Nothing else may allocate here: the thread may hold the lock. No descriptor is 1 << 30.
     pollfd listener = {loaded.get_future().get(), POLLIN, 0};
-    for (__u32 ours = 0;
-         listener.fd >= 0 && ::poll(&listener, 1, -1) == 1 && listener.revents == POLLIN;) {
+    for (__u32 ours = 0; ::poll(&listener, 1, -1) == 1 && listener.revents == POLLIN;) {
       seccomp_notif call = {};
       if (seccomp_notify_receive(listener.fd, &call) != 0) continue;
       if (call.data.nr == SCMP_SYS(rt_sigaction) && call.data.args[0] == SIGPIPE) ours = call.pid;
