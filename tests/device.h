@@ -179,6 +179,7 @@ struct device : testing::Test {
       if (call.data.nr == SCMP_SYS(rt_sigaction) && call.data.args[0] == SIGPIPE) ours = call.pid;
       seccomp_notif_resp answer = {call.id, 0, 0, SECCOMP_USER_NOTIF_FLAG_CONTINUE};
       if (call.pid == ours) {
+        EXPECT_TRUE(call.data.nr != SCMP_SYS(access) || call.data.args[1] == F_OK);
         char* const name = seccomp_syscall_resolve_num_arch(call.data.arch, call.data.nr);
         if (const int error = watch(name); error != 0) answer = {call.id, 0, -error, 0};
         // A brk that fails gives the end of the heap as it is, and no error number; 0 will do.
@@ -189,8 +190,7 @@ struct device : testing::Test {
     }
     starter.join();
     seccomp_release(filter);
-    // Closes the listener, without which the library would not ask for another.
-    seccomp_reset(nullptr, 0);
+    seccomp_reset(nullptr, 0);  // Closes the listener; else the library would not ask for another.
 #endif
   }
 };
