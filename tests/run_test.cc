@@ -21,13 +21,12 @@ const std::string data = R"(
     ~/tz/2023c.1.0/zoneinfo/+VERSION = 2030a
     ~/tz/2023c.1.0/zoneinfo/Europe/Paris = TZif
 )";
+// Entries, then messages. What does not end in a newline wants the rest.
 const std::string on_system = "~/zoneinfo -> /usr/share/zoneinfo.default\n";
 static std::string on(const std::string& version) {
   return "~/zoneinfo -> ~/tz/" + version + "/zoneinfo\n~/icutz -> ~/tz/" + version + "/icutz\n";
 }
-static std::string record(const std::string& text) {
-  return "~/TZVersionDiffRecord = " + text + "\n";
-}
+static std::string record(const std::string& of) { return "~/TZVersionDiffRecord = " + of + "\n"; }
 const std::string reset = on_system + "- ~/icutz\n", opt = "~/zoneinfo -> /opt\n";
 const std::string newest = "~/tz_latest -> ~/tz/", latest = newest + "2023c.1.0\n";
 const std::string activated = on("2023c.1.0") + record("2022a.1.0_2023c.1.0");
@@ -103,6 +102,7 @@ TEST_F(device, the_legacy_icu_link_is_carried_over_unless_there_is_a_new_one) {
                  {"/var/db/icutz = file\n~/icutz -> /var\n/var/db/icu/", gone + "- /var/db/icu/"},
                  {legacy + "/usr\n~/icutz -> /a", no_link + "icutz to /usr\n" + failed + gone},
                  {legacy + "/a\n/var/db/icu/full/", ""},
+                 {"/var/db/icutz = file", unread + "/var/db/icutz\n" + failed + gone},
                  {"/var/db/icutz/", unread + "/var/db/icutz\n" + failed + kept +
                                         "/var/db/icutz\nCould not remove /var/db/icutz\n"}});
 }
