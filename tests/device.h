@@ -157,7 +157,7 @@ struct device : testing::Test {
 
   // Does `start` in a thread whose calls, and those of the program that it starts, the kernel holds
   // until they are answered: `watch` decides from where main() ignores SIGPIPE.
-  static void watch_calls([[maybe_unused]] const watcher& watch, const action& start) {
+  static void watch_calls(const watcher& watch, const action& start) {
 #ifdef KELVANE_SECCOMP
     const scmp_filter_ctx filter = seccomp_init(SCMP_ACT_NOTIFY);
     // The C library, or a sanitizer, aborts where these fail; set_value() below needs futex.
