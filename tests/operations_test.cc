@@ -112,31 +112,30 @@ TEST_F(device, a_path_below_the_downloads_names_a_data_set) {
 TEST_F(device, the_schema_is_in_the_name_of_a_readable_file_directly_in_the_directory) {
   static constexpr char data[] = "/var/db/timezone/tz/1a/icutz/icutz44l.dat";
   // With this schema on the system, and this entry in a download: what is said, and if they match.
-  const auto expect_match = [](const std::string& wanted, const std::string& schema,
-                               const std::string& entry, const action& edit = {}) {
+  const auto matches = [](const std::string& wanted, const std::string& schema,
+                          const std::string& entry, const action& edit = {}) {
     build("/usr/share/icu/icutzformat.txt = " + schema + "\n~/tz/1a/icutz" + entry);
     if (edit) edit();
     const action compare = [] { warn("%d", orv_icu(tz + "1a").compatible_schema(orv_icu())); };
     EXPECT_EQ(outcome(compare), wanted) << entry;
   };
   const std::string none = "No ICU schema found for " + tz + "1a\n1\n", file = "/icutz44l.dat = ";
-  expect_match("1\n", "007e", "/icutz007e.dat = ");
+  matches("1\n", "007e", "/icutz007e.dat = ");
   // Of several the first in the directory's own order; with so many, that is hardly by name.
   std::string many = "/icutz0b.dat = ";
   for (int i = 1; i < 50; ++i) many += "\n~/tz/1a/icutz/icutz" + std::to_string(i) + "e.dat = ";
   build("~/tz/1a/icutz" + many);
-  expect_match("1\n", fs::directory_iterator(tz + "1a/icutz")->path().stem().string().substr(5),
-               many);
-  expect_match("1\n", "44l", " -> /var/icu\n/var/icu" + file, [] { ::chmod(data, 0115); });
-  for (const char* other : {"044l", "44l0", "44", "44L", ""}) expect_match("0\n", other, file);
-  expect_match(none, "", file, [] { ::chmod(data, 0662); });
-  expect_match(none, "", file, [] { ::unlink(data), ::mkfifo(data, 0644); });
+  matches("1\n", fs::directory_iterator(tz + "1a/icutz")->path().stem().string().substr(5), many);
+  matches("1\n", "44l", " -> /var/icu\n/var/icu" + file, [] { ::chmod(data, 0115); });
+  for (const char* other : {"044l", "44l0", "44", "44L", ""}) matches("0\n", other, file);
+  matches(none, "", file, [] { ::chmod(data, 0662); });
+  matches(none, "", file, [] { ::unlink(data), ::mkfifo(data, 0644); });
   for (const char* entry :
        {"44l.dat = ", "/icutz44l.dat -> /usr/share/icu/icutzformat.txt",
         "/icutz44l.dat/below = ", "/below/icutz44l.dat = ", "/icutz44l.dat.bak = ",
         "/xicutz44l.dat = ", "/icutz44L.dat = ", "/icutz44a.dat = ", "/icutzl.dat = ",
         "/icutz44lxdat = ", "/icutz44.dat = ", "/icudt44l.dat = "})
-    expect_match(none, "", entry);
+    matches(none, "", entry);
   const std::string deep(70000, 'x');
   EXPECT_EQ(outcome([&] { orv_icu{deep}; }), "tz_icu::initialize: fts_open of " + deep +
                                                  "/icutz failed, File name too long\nint 36\n");

@@ -227,7 +227,7 @@ TEST_F(disturbed_run, leaves_what_the_next_run_puts_right) {
       {on("2023c.1.0") + "- ~/icutz\n" + legacy + "~/tz/2023c.1.0/icutz\n" + latest, 1},
       {old_paris + "/var/db/icu = file\n", 0},
       {opt + latest, 1}};
-  const std::regex varies(".*Record .*\n|Europe/Paris|America/Los_Angeles"), words("^(.*\n)*?/usr");
+  const std::regex varies(".*Record .*\n|Europe/Paris|America/Los_Angeles"), icu(".*e/icutz .*\n");
   for (const auto& [before, left_behind] : table) {
     states = {text(usual + before)};
     // Each call fails once, then it and all after it.
@@ -242,10 +242,11 @@ TEST_F(disturbed_run, leaves_what_the_next_run_puts_right) {
     std::vector<std::string> ends;
     for (std::size_t i = 0; i < states.size(); ++i) {
       build(states[i]);
-      const std::string first = boot(note), again = boot(failing("symlink"));
+      const std::string first = boot(note), sound = listing(), again = boot(failing("symlink"));
       EXPECT_EQ((first + again).find("status"), std::string::npos) << states[i];
-      EXPECT_EQ(std::regex_replace(again, words, ""), std::regex_replace(first, words, ""));
-      ends.push_back(std::regex_replace(listing(), varies, ""));
+      EXPECT_EQ(listing(), sound);
+      ends.push_back(std::regex_replace(sound, varies, ""));
+      EXPECT_EQ(std::regex_replace(ends[i], icu, ""), std::regex_replace(ends[0], icu, ""));
     }
     EXPECT_EQ(std::ranges::count(ends, ends[0]) + left_behind, states.size()) << before;
   }
