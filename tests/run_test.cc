@@ -44,7 +44,7 @@ const std::string not_reset = "Could not reset to system partition\n";
 const std::string no_zone =
     "localtime link invalid; resetting to America/Los_Angeles\n" + los_angeles;
 const std::string corrected = "Correcting localtime link to ~/zoneinfo";
-const std::string no_schema = "No ICU schema found for ~/tz/2026a\n";
+const std::string no_schema = "No ICU schema found for ~/tz/";
 const std::string kept = "remove: could not remove ", unread = "read_symlink: ";
 const std::string no_link = "create_symlink: from ~/", bad_link = "Bad zoneinfo link ";
 const std::string no_system = no_link + "zoneinfo to /usr/share/zoneinfo.default\n";
@@ -60,11 +60,12 @@ TEST_F(device, the_newest_usable_data_set_is_selected) {
          {{"~/zoneinfo -> ~/tz/2022b/", on(c) + record("2022b_2023c.1.0")},
           {version + "02023c", not_newer + c + " vs. 02023c.1.0\n"},
           {newest + "2022z", not_newer + "2022z vs. 2022a.1.0\n"},
-          {newest + "2026a", no_schema + not_newer + "2026a vs. 2022a.1.0\n"},
+          {newest + "2026a", no_schema + "2026a\n" + not_newer + "2026a vs. 2022a.1.0\n"},
           // A rejected data set is still what an update is compared with.
           {version + "02024b\n" + on("2022b"), rejected + on(c) + record("02024b.1.0_2023c.1.0")},
           {version + "2024b\n" + on(c), rejected + not_newer + c + than_c + reset},
           {on("2022z") + newest + "2022b", rejected + not_newer + "2022b vs. 2022z\n" + reset},
+          {on("2022a.1.0"), no_schema + "2022a.1.0\n" + rejected + activated},
           // Names that are no version, and numbers too large.
           {"- " + system, bad + bad + on(c) + record(".1.0_2023c.1.0")},
           {on(c) + newest + "2022b/", no_version("2022b/") + not_newer + "2022b/" + than_c},
@@ -73,6 +74,7 @@ TEST_F(device, the_newest_usable_data_set_is_selected) {
 }
 
 TEST_F(device, what_stands_in_a_links_place_is_replaced_or_reported) {
+  const std::string bad = no_version(".1.0"), again = bad + no_system;
   const std::string bad_path = "orv_dataset::create_components: bad path tz/2022b\n";
   const std::string bare = "/usr/share/icu/icutzformat.txt = \n/usr/share/icu/icutz44l.dat = \n";
   const std::string kept_icu = kept + "~/icutz\nunlink of ICU softlink failed\n";
@@ -85,12 +87,9 @@ TEST_F(device, what_stands_in_a_links_place_is_replaced_or_reported) {
                   kept_icu + no_link + "icutz to ~/tz/2023c.1.0/icutz\n" + unable + kept_icu},
                  {latest + "~/TZVersionDiffRecord -> /var/r",
                   on("2023c.1.0") + "/var/r = 2022a.1.0_2023c.1.0"},
-                 {bare + newest + "2026a", no_schema + on("2026a") + record("2022a.1.0_2026a")}});
-}
-
-TEST_F(device, what_fails_for_good_is_said_and_the_rest_goes_on) {
-  const std::string bad = no_version(".1.0"), again = bad + no_system;
-  expect(usual, {{"- ~/zoneinfo\n~/zoneinfo/\n~/icutz -> /a", unread + "~/zoneinfo\n" + no_reset}});
+                 {bare + newest + "2026a",
+                  no_schema + "2026a\n" + on("2026a") + record("2022a.1.0_2026a")},
+                 {"- ~/zoneinfo\n~/zoneinfo/\n~/icutz -> /a", unread + "~/zoneinfo\n" + no_reset}});
   expect("", {{"/var/db/",
                bad + bad_link + "\n" + invalid + again + unable + again + not_reset + no_default}});
 }
@@ -101,6 +100,7 @@ TEST_F(device, the_legacy_icu_link_is_carried_over_unless_there_is_a_new_one) {
   expect(usual, {{legacy + "../../usr", gone + "~/icutz -> ../../usr"},
                  {"/var/db/icutz = file\n~/icutz -> /var\n/var/db/icu/", gone + "- /var/db/icu/"},
                  {legacy + "/usr\n~/icutz -> /a", no_link + "icutz to /usr\n" + failed + gone},
+                 {"/var/db/icutz = file", unread + "/var/db/icutz\n" + failed + gone},
                  {legacy + "/a\n/var/db/icu/full/", ""},
                  {"/var/db/icutz/", unread + "/var/db/icutz\n" + failed + kept +
                                         "/var/db/icutz\nCould not remove /var/db/icutz\n"}});
@@ -125,36 +125,34 @@ static void limit(decltype(RLIMIT_AS) resource, rlim_t value) {
 }
 
 TEST_F(device, surroundings_change_nothing_else) {
-  static constexpr char written[] = "/var/db/timezone/TZVersionDiffRecord";
+  static constexpr char file[] = "/var/db/timezone/TZVersionDiffRecord";
   static constexpr char* no_arguments[] = {nullptr};
-  static const rlim_t files = fs::exists("/sbin/emulator") ? 9 : 4;
+  static const rlim_t files = fs::exists("/sbin/emulator") ? 9 : 1;
   const std::string store = data + on_system + latest;
   const text_pairs said = {{"", no_zone + activated}}, unsaid = {{"", los_angeles + activated}};
-  expect(store, unsaid, {}, [] { ::close(0), ::close(1), ::close(2); });
+  // An emulator has descriptors of its own.
+  expect(store, unsaid, {}, [] { ::close_range(0, 2, 0), limit(RLIMIT_NOFILE, files); });
   expect(store, unsaid, {}, [] { ::close(2); });
   // Standard error without a reader, then one that may not grow, like the record.
   static int ends[2];
   expect(store, unsaid, {}, [] { ::pipe(ends), ::close(ends[0]), ::dup2(ends[1], 2); });
   expect(store, {{"", los_angeles + activated + record("")}}, {}, [] { limit(RLIMIT_FSIZE, 0); });
-  // ctest leaves its log open as 3; an emulator has descriptors of its own.
-  expect(store, said, {}, [] { ::close(3), limit(RLIMIT_NOFILE, files); });
   expect(store, said, {}, [] { limit(RLIMIT_STACK, 256 << 10); });
   expect(store, said, {}, [] { limit(RLIMIT_AS, KELVANE_SANITIZED ? RLIM_INFINITY : 8 << 20); });
   expect(store, said, {}, [] { ::umask(0777); });
   expect(store, said, {}, [] { ::mkdir("/cwd", 0), fs::current_path("/cwd"), ::rmdir("/cwd"); });
-  expect(store, {{"", no_zone + on("2023c.1.0")}}, {}, [] { ::mkfifo(written, 0); });
+  expect(store, {{"", no_zone + on("2023c.1.0") + file + " ?"}}, {}, [] { ::mkfifo(file, 0); });
   expect(store, said, {}, [] { ::execv("/sbin/kelvane", no_arguments); });
   EXPECT_EQ(fs::status("/var/db/timezone").permissions(), fs::perms(0757));
-  EXPECT_TRUE(fs::status(written).permissions() == fs::perms(0646) && fs::file_size(written) == 19);
+  EXPECT_TRUE(fs::status(file).permissions() == fs::perms(0646) && content(file).back() == '0');
 }
 
 // Runs whose system calls are watched.
 struct disturbed_run : device {
   void SetUp() override {
     device::SetUp();
-    bool watched = false;
-    watch_calls([&](const std::string&) { return watched = true, 0; }, prepare_warnings);
-    if (!watched) GTEST_SKIP() << "the system calls of a run cannot be watched here";
+    build(""), boot(note);
+    if (states.empty()) GTEST_SKIP() << "the system calls of a run cannot be watched here";
   }
 
   // Lets the call of this number fail, of those whose names begin so, and all after it if asked.
@@ -162,7 +160,10 @@ struct disturbed_run : device {
   int error = EIO;
   watcher failing(const std::string& names, int number = 1, bool onward = false) {
     failed.clear();
-    const std::regex begin("^(" + names + ")");
+    // A program, or a sanitizer, breaks off where these fail.
+    const std::string own =
+        KELVANE_SANITIZED ? "exit|m|brk|sigalt|rt_sigproc|gettid|tgkill" : "exit";
+    const std::regex begin("^(?!" + own + ")(" + names + ")");
     return [=, this, left = number](const std::string& call) mutable {
       if (!std::regex_search(call, begin) || --left > 0 || (left < 0 && !onward)) return 0;
       failed += call;
@@ -189,6 +190,9 @@ TEST_F(disturbed_run, says_what_failed_and_goes_on) {
     expect(usual, {{latest + legacy + "/a", kept_legacy + activated}}, failing("unlink", 4));
     expect(usual, {{latest, on("2023c.1.0") + record("")}}, failing("write"));
     expect(usual, {{legacy + "/usr", "- /var/db/icutz"}}, failing("access|faccess"));
+    expect(usual, {{zone + "/usr/share/zoneinfo/No", corrected + "/No\n" + no_default}},
+           failing("symlink"));
+    expect(usual, {{latest, activated}}, failing("read$", 2));
     expect(usual, {{old_paris, no_paris + no_zone}}, failing("symlink"));
     // A store that has become read-only.
     expect(usual, {{"~/zoneinfo = file", unread + "~/zoneinfo\n" + no_reset}},
