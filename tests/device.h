@@ -139,10 +139,8 @@ struct device : testing::Test {
       if (prepare) prepare();
       ::execl("/sbin/emulator", "emulator", "/sbin/kelvane", nullptr);  // Of another machine.
       ::execl("/sbin/kelvane", "any-name", "-n", "--version", nullptr);
-      ::_exit(127);
     };
-    const std::string result = outcome(run, watch);
-    return result + listing();
+    return outcome(run, watch).append(listing());
   }
 
   // Boots a device of each first text, which gives the second: what is said, then what changes.

@@ -160,10 +160,7 @@ struct disturbed_run : device {
   int error = EIO;
   watcher failing(const std::string& names, int number = 1, bool onward = false) {
     failed.clear();
-    // A program, or a sanitizer, breaks off where these fail.
-    const std::string own =
-        KELVANE_SANITIZED ? "exit|m|brk|sigalt|rt_sigproc|gettid|tgkill" : "exit";
-    const std::regex begin("^(?!" + own + ")(" + names + ")");
+    const std::regex begin("^(" + names + ")");
     return [=, this, left = number](const std::string& call) mutable {
       if (!std::regex_search(call, begin) || --left > 0 || (left < 0 && !onward)) return 0;
       failed += call;
@@ -231,13 +228,16 @@ TEST_F(disturbed_run, leaves_what_the_next_run_puts_right) {
       {on("2023c.1.0") + "- ~/icutz\n" + legacy + "~/tz/2023c.1.0/icutz\n" + latest, 1},
       {old_paris + "/var/db/icu = file\n", 0},
       {opt + latest, 1}};
+  // The program's own end, or a sanitizer's calls, must not fail.
+  const std::string any =
+      KELVANE_SANITIZED ? "open|close|read|write|get|.*(stat|link|dir)" : "[^e]";
   const std::regex varies(".*Record .*\n|Europe/Paris|America/Los_Angeles"), icu(".*e/icutz .*\n");
   for (const auto& [before, left_behind] : table) {
     states = {text(usual + before)};
     // Each call fails once, then it and all after it.
     for (int number = 2; number == 2 || failed != ""; ++number) {
       build(states[0]);
-      const std::string got = boot(failing("", number / 2, number % 2 == 1));
+      const std::string got = boot(failing(any, number / 2, number % 2 == 1));
       // A run that is short of memory may end by a signal.
       const bool memory = std::regex_search(failed, std::regex("brk|mmap"));
       EXPECT_TRUE(memory || !std::regex_search(got, std::regex("status (?!1\n)"))) << got;
