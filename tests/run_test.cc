@@ -13,7 +13,7 @@ namespace kelvane {
 const std::string data = R"(
     /usr/share/zoneinfo.default/+VERSION = 2022a
     /usr/share/zoneinfo.default/Europe/Paris = TZif
-    /usr/share/icu/icutzformat.txt = 44l
+    /usr/share/icu/icutzformat.txt = 44l and more
     ~/tz/2022z/icutz/icutz44b.dat = data
     ~/tz/2022b/icutz/icutz44l.dat = data
     ~/tz/2023c.1.0/icutz/icutz44l.dat = data
@@ -27,13 +27,13 @@ static std::string on(const std::string& version) {
   return "~/zoneinfo -> ~/tz/" + version + "/zoneinfo\n~/icutz -> ~/tz/" + version + "/icutz\n";
 }
 static std::string record(const std::string& of) { return "~/TZVersionDiffRecord = " + of + "\n"; }
-const std::string reset = on_system + "- ~/icutz\n", opt = "~/zoneinfo -> /opt\n";
-const std::string newest = "~/tz_latest -> ~/tz/", latest = newest + "2023c.1.0\n";
-const std::string activated = on("2023c.1.0") + record("2022a.1.0_2023c.1.0");
+const std::string reset = on_system + "- ~/icutz\n- /var/db/icutz\n", opt = "~/zoneinfo -> /opt\n";
+const std::string c = "2023c.1.0", newest = "~/tz_latest -> ~/tz/", latest = newest + c + "\n";
+const std::string activated = on(c) + record("2022a.1.0_2023c.1.0");
 const std::string legacy = "/var/db/icutz -> ", zone = "~/localtime -> ";
-const std::string paris = zone + "~/zoneinfo/Europe/Paris\n";
-const std::string old_paris = zone + "/usr/share/zoneinfo/Europe/Paris\n";
-const std::string los_angeles = zone + "~/zoneinfo/America/Los_Angeles\n";
+const std::string paris = zone + "~/zoneinfo/Europe//Paris\n";
+const std::string old_paris = zone + "/usr/share/zoneinfo/Europe//Paris\n";
+const std::string pacific = zone + "~/zoneinfo/America/Los_Angeles\n";
 const std::string usual = data + on_system + paris + record("longer than what is written now");
 
 const std::string invalid = "Invalid current symlinks; resetting to system partition\n";
@@ -41,10 +41,9 @@ const std::string rejected = "Symlink points at data incompatible with installed
 const std::string not_newer = "New update not compatible or older version: ";
 const std::string unable = "Unable to locate data; resetting to system partition\n";
 const std::string not_reset = "Could not reset to system partition\n";
-const std::string no_zone =
-    "localtime link invalid; resetting to America/Los_Angeles\n" + los_angeles;
+const std::string no_zone = "localtime link invalid; resetting to America/Los_Angeles\n" + pacific;
 const std::string corrected = "Correcting localtime link to ~/zoneinfo";
-const std::string no_schema = "No ICU schema found for ~/tz/";
+const std::string no_data = "No ICU schema found for ~/tz/";
 const std::string kept = "remove: could not remove ", unread = "read_symlink: ";
 const std::string no_link = "create_symlink: from ~/", bad_link = "Bad zoneinfo link ";
 const std::string no_system = no_link + "zoneinfo to /usr/share/zoneinfo.default\n";
@@ -54,21 +53,22 @@ const std::string no_default = no_zone + no_link + "localtime to ~/zoneinfo/Amer
                                "Could not reset localtime link\nstatus 1\n- ~/localtime\n";
 
 TEST_F(device, the_newest_usable_data_set_is_selected) {
-  const std::string c = "2023c.1.0", than_c = " vs. 2023c.1.0\n", bad = no_version(".1.0");
-  const std::string system = "/usr/share/zoneinfo.default/+VERSION", version = system + " = ";
+  const std::string vs_c = " vs. 2023c.1.0\n", bad = no_version("2022a.1.1.0");
+  const std::string version = "/usr/share/zoneinfo.default/+VERSION = ";
   expect(usual + latest,
          {{"~/zoneinfo -> ~/tz/2022b/", on(c) + record("2022b_2023c.1.0")},
           {version + "02023c", not_newer + c + " vs. 02023c.1.0\n"},
+          {version + "2023c\n" + on(c), not_newer + c + vs_c},
           {newest + "2022z", not_newer + "2022z vs. 2022a.1.0\n"},
-          {newest + "2026a", no_schema + "2026a\n" + not_newer + "2026a vs. 2022a.1.0\n"},
+          {newest + "2026a", no_data + "2026a\n" + not_newer + "2026a vs. 2022a.1.0\n"},
           // A rejected data set is still what an update is compared with.
           {version + "02024b\n" + on("2022b"), rejected + on(c) + record("02024b.1.0_2023c.1.0")},
-          {version + "2024b\n" + on(c), rejected + not_newer + c + than_c + reset},
+          {legacy + "/a\n" + version + "2024b\n" + on(c), rejected + not_newer + c + vs_c + reset},
           {on("2022z") + newest + "2022b", rejected + not_newer + "2022b vs. 2022z\n" + reset},
-          {on("2022a.1.0"), no_schema + "2022a.1.0\n" + rejected + activated},
+          {on("2022a.1.0"), no_data + "2022a.1.0\n" + rejected + activated},
           // Names that are no version, and numbers too large.
-          {"- " + system, bad + bad + on(c) + record(".1.0_2023c.1.0")},
-          {on(c) + newest + "2022b/", no_version("2022b/") + not_newer + "2022b/" + than_c},
+          {version + "2022a.1", bad + bad + on(c) + record("2022a.1.1.0_2023c.1.0")},
+          {on(c) + newest + "2022b/", no_version("2022b/") + not_newer + "2022b/" + vs_c},
           {version + "99999999999a\n~/tz_latest = file", unable + not_reset + "status 1\n"},
           {on("2022b") + newest + "2023c.99999999999", unable + reset}});
 }
@@ -77,40 +77,41 @@ TEST_F(device, what_stands_in_a_links_place_is_replaced_or_reported) {
   const std::string bad = no_version(".1.0"), again = bad + no_system;
   const std::string bad_path = "orv_dataset::create_components: bad path tz/2022b\n";
   const std::string bare = "/usr/share/icu/icutzformat.txt = \n/usr/share/icu/icutz44l.dat = \n";
+  const std::string no_icu = no_link + "icutz to ~/tz/2023c.1.0/icutz\n";
   const std::string kept_icu = kept + "~/icutz\nunlink of ICU softlink failed\n";
-  expect(usual, {{on("2022b") + "- ~/zoneinfo\n" + latest, bad_link + "\n" + invalid + activated},
-                 {"~/zoneinfo = file", unread + "~/zoneinfo\n" + invalid + on_system},
-                 {on("2022z") + "~/tz_latest -> tz/2022b", rejected + bad_path + unable + reset},
-                 // Nothing is said of the zoneinfo link, which is not even read.
-                 {opt + "~/tz_latest = file", unread + "~/tz_latest\n" + unable + on_system},
-                 {latest + "~/icutz/",
-                  kept_icu + no_link + "icutz to ~/tz/2023c.1.0/icutz\n" + unable + kept_icu},
-                 {latest + "~/TZVersionDiffRecord -> /var/r",
-                  on("2023c.1.0") + "/var/r = 2022a.1.0_2023c.1.0"},
-                 {bare + newest + "2026a",
-                  no_schema + "2026a\n" + on("2026a") + record("2022a.1.0_2026a")},
-                 {"- ~/zoneinfo\n~/zoneinfo/\n~/icutz -> /a", unread + "~/zoneinfo\n" + no_reset}});
+  expect(usual,
+         {{bare + newest + "2026a", no_data + "2026a\n" + on("2026a") + record("2022a.1.0_2026a")},
+          {bare + on("x"), no_version("x") + no_data + "x\n" + rejected + reset},
+          {on("2022b"), ""},
+          {on("2022b") + "- ~/zoneinfo\n" + latest, bad_link + "\n" + invalid + activated},
+          {"~/zoneinfo = file", unread + "~/zoneinfo\n" + invalid + on_system},
+          {on("2022b") + "~/tz_latest -> tz/2022b", bad_path + unable + reset},
+          // Nothing is said of the zoneinfo link, which is not even read.
+          {opt + "~/tz_latest = file", unread + "~/tz_latest\n" + unable + on_system},
+          {latest + legacy + "/a\n~/icutz/", kept_icu + no_icu + unable + kept_icu},
+          {latest + "~/TZVersionDiffRecord -> /var/r", on(c) + "/var/r = 2022a.1.0_2023c.1.0"},
+          {"- ~/zoneinfo\n~/zoneinfo/\n~/icutz -> /a", unread + "~/zoneinfo\n" + no_reset}});
   expect("", {{"/var/db/",
                bad + bad_link + "\n" + invalid + again + unable + again + not_reset + no_default}});
 }
 
 TEST_F(device, the_legacy_icu_link_is_carried_over_unless_there_is_a_new_one) {
-  const std::string gone = "- /var/db/icutz\n";
+  const std::string old = "/var/db/icutz\n", gone = "- " + old;
   const std::string failed = "Could not migrate /var/db/icutz to ~/icutz\n";
-  expect(usual, {{legacy + "../../usr", gone + "~/icutz -> ../../usr"},
-                 {"/var/db/icutz = file\n~/icutz -> /var\n/var/db/icu/", gone + "- /var/db/icu/"},
-                 {legacy + "/usr\n~/icutz -> /a", no_link + "icutz to /usr\n" + failed + gone},
-                 {"/var/db/icutz = file", unread + "/var/db/icutz\n" + failed + gone},
-                 {legacy + "/a\n/var/db/icu/full/", ""},
-                 {"/var/db/icutz/", unread + "/var/db/icutz\n" + failed + kept +
-                                        "/var/db/icutz\nCould not remove /var/db/icutz\n"}});
+  expect(usual,
+         {{legacy + "../../usr", gone + "~/icutz -> ../../usr"},
+          {"/var/db/icutz = file\n~/icutz -> /var\n/var/db/icu/", gone + "- /var/db/icu/"},
+          {legacy + "/usr\n~/icutz -> /a", no_link + "icutz to /usr\n" + failed + gone},
+          {"/var/db/icutz = file", unread + old + failed + gone},
+          {legacy + "/a\n/var/db/icu/full/", ""},
+          {"/var/db/icutz/", unread + old + failed + kept + old + "Could not remove " + old}});
 }
 
 TEST_F(device, the_localtime_link_is_made_to_lead_through_the_store) {
   expect(data + on_system, {{zone + "~/zoneinfo", ""},
                             {zone + "~/zoneinfoX/../No/Zone", ""},
                             {zone + "~/zoneinf", no_zone},
-                            {zone + "zoneinfo/../../../..~/zoneinfo/Europe/Paris", no_zone},
+                            {zone + "zoneinfo/../../../..~/zoneinfo/usr/share/zoneinfo", no_zone},
                             {zone + "/usr/share/zoneinf", no_zone},
                             {zone + "/usr/share/zoneinfo", corrected + "\n" + zone + "~/zoneinfo"},
                             {"~/zoneinfo.default -> /a\n" + zone + "/usr/share/zoneinfo.default",
@@ -127,21 +128,20 @@ static void limit(decltype(RLIMIT_AS) resource, rlim_t value) {
 TEST_F(device, surroundings_change_nothing_else) {
   static constexpr char file[] = "/var/db/timezone/TZVersionDiffRecord";
   static constexpr char* no_arguments[] = {nullptr};
-  static const rlim_t files = fs::exists("/sbin/emulator") ? 9 : 1;
+  static const rlim_t files = KELVANE_SANITIZED || fs::exists("/sbin/emulator") ? 9 : 1;
   const std::string store = data + on_system + latest;
-  const text_pairs said = {{"", no_zone + activated}}, unsaid = {{"", los_angeles + activated}};
-  // An emulator has descriptors of its own.
+  const text_pairs said = {{"", no_zone + activated}}, unsaid = {{"", pacific + activated}};
+  // A sanitizer and an emulator have descriptors of their own.
   expect(store, unsaid, {}, [] { ::close_range(0, 2, 0), limit(RLIMIT_NOFILE, files); });
-  expect(store, unsaid, {}, [] { ::close(2); });
   // Standard error without a reader, then one that may not grow, like the record.
   static int ends[2];
   expect(store, unsaid, {}, [] { ::pipe(ends), ::close(ends[0]), ::dup2(ends[1], 2); });
-  expect(store, {{"", los_angeles + activated + record("")}}, {}, [] { limit(RLIMIT_FSIZE, 0); });
+  expect(store, {{"", pacific + activated + record("")}}, {}, [] { limit(RLIMIT_FSIZE, 0); });
   expect(store, said, {}, [] { limit(RLIMIT_STACK, 256 << 10); });
   expect(store, said, {}, [] { limit(RLIMIT_AS, KELVANE_SANITIZED ? RLIM_INFINITY : 8 << 20); });
   expect(store, said, {}, [] { ::umask(0777); });
   expect(store, said, {}, [] { ::mkdir("/cwd", 0), fs::current_path("/cwd"), ::rmdir("/cwd"); });
-  expect(store, {{"", no_zone + on("2023c.1.0") + file + " ?"}}, {}, [] { ::mkfifo(file, 0); });
+  expect(store, {{"", no_zone + on(c) + file + " ?"}}, {}, [] { ::mkfifo(file, 0); });
   expect(store, said, {}, [] { ::execv("/sbin/kelvane", no_arguments); });
   EXPECT_EQ(fs::status("/var/db/timezone").permissions(), fs::perms(0757));
   EXPECT_TRUE(fs::status(file).permissions() == fs::perms(0646) && content(file).back() == '0');
@@ -178,19 +178,23 @@ struct disturbed_run : device {
 };
 
 TEST_F(disturbed_run, says_what_failed_and_goes_on) {
-  const std::string no_paris =
-      corrected + "/Europe/Paris\n" + no_link + "localtime to ~/zoneinfo/Europe/Paris\n";
   const std::string kept_legacy = kept + "/var/db/icutz\nunlink of ICU softlink failed\n";
   for (error = EINTR; error <= ELOOP; ++error) {
     expect(usual, {{latest, unread + "~/tz_latest\n" + unable}}, failing("readlink"));
-    expect(usual, {{on("2022z"), rejected + no_system + unable + reset}}, failing("symlink"));
     expect(usual, {{latest + legacy + "/a", kept_legacy + activated}}, failing("unlink", 4));
-    expect(usual, {{latest, on("2023c.1.0") + record("")}}, failing("write"));
+    expect(usual, {{latest, on(c) + record("")}}, failing("write"));
     expect(usual, {{legacy + "/usr", "- /var/db/icutz"}}, failing("access|faccess"));
-    expect(usual, {{zone + "/usr/share/zoneinfo/No", corrected + "/No\n" + no_default}},
-           failing("symlink"));
+    expect(usual, {{"", no_version(".1.0")}}, failing("open", 3));
     expect(usual, {{latest, activated}}, failing("read$", 2));
-    expect(usual, {{old_paris, no_paris + no_zone}}, failing("symlink"));
+    expect(usual, {{latest, no_data + c + "\n" + not_newer + c + " vs. 2022a.1.0\n"}},
+           failing("getdents"));
+    expect(usual,
+           {{on("2022z"), rejected + no_system + unable + reset},
+            {latest, no_link + "zoneinfo to ~/tz/2023c.1.0/zoneinfo\n" + unable},
+            {zone + "/usr/share/zoneinfo/No", corrected + "/No\n" + no_default},
+            {old_paris, corrected + "/Europe//Paris\n" + no_link +
+                            "localtime to ~/zoneinfo/Europe//Paris\n" + no_zone}},
+           failing("symlink"));
     // A store that has become read-only.
     expect(usual, {{"~/zoneinfo = file", unread + "~/zoneinfo\n" + no_reset}},
            failing("symlink|unlink|rmdir", 1, true));
@@ -206,12 +210,11 @@ TEST_F(disturbed_run, says_each_line_at_once_and_changes_links_in_this_order) {
     if (said() + listing() != history.back()) history.push_back(said() + listing());
     return 0;
   };
-  boot(observe);
-  observe("exit");
+  boot(observe), observe("exit");
   for (const std::string& change : lines_of(
            "~/icutz -> /usr\n- /var/db/icutz\n- /var/db/icu\n" + rejected + "- ~/zoneinfo\n" +
-           on_system + "- ~/icutz\n- ~/zoneinfo\n" + on("2023c.1.0") + record("") +
-           record("2022a.1.0_2023c.1.0") + corrected + "/Europe/Paris\n- ~/localtime\n" + paris))
+           on_system + "- ~/icutz\n- ~/zoneinfo\n" + on(c) + record("") +
+           record("2022a.1.0_2023c.1.0") + corrected + "/Europe//Paris\n- ~/localtime\n" + paris))
     wanted.push_back(text(now += change + "\n"));
   EXPECT_EQ(history, wanted);
 }
@@ -225,19 +228,16 @@ TEST_F(disturbed_run, leaves_what_the_next_run_puts_right) {
       {on("2022b") + latest, 2},
       {on("2022z") + latest, 2},
       {on("2022z") + newest + "2022z\n", 1},
-      {on("2023c.1.0") + "- ~/icutz\n" + legacy + "~/tz/2023c.1.0/icutz\n" + latest, 1},
+      {on(c) + "- ~/icutz\n" + legacy + "~/tz/2023c.1.0/icutz\n" + latest, 1},
       {old_paris + "/var/db/icu = file\n", 0},
       {opt + latest, 1}};
-  // The program's own end, or a sanitizer's calls, must not fail.
-  const std::string any =
-      KELVANE_SANITIZED ? "open|close|read|write|get|.*(stat|link|dir)" : "[^e]";
-  const std::regex varies(".*Record .*\n|Europe/Paris|America/Los_Angeles"), icu(".*e/icutz .*\n");
+  const std::regex varies(".*Record .*\n|Europe//Paris|America/Los_Angeles"), icu(".*e/icutz .*\n");
   for (const auto& [before, left_behind] : table) {
     states = {text(usual + before)};
     // Each call fails once, then it and all after it.
     for (int number = 2; number == 2 || failed != ""; ++number) {
       build(states[0]);
-      const std::string got = boot(failing(any, number / 2, number % 2 == 1));
+      const std::string got = boot(failing("", number / 2, number % 2 == 1));
       // A run that is short of memory may end by a signal.
       const bool memory = std::regex_search(failed, std::regex("brk|mmap"));
       EXPECT_TRUE(memory || !std::regex_search(got, std::regex("status (?!1\n)"))) << got;
@@ -247,8 +247,7 @@ TEST_F(disturbed_run, leaves_what_the_next_run_puts_right) {
     for (std::size_t i = 0; i < states.size(); ++i) {
       build(states[i]);
       const std::string first = boot(note), sound = listing(), again = boot(failing("symlink"));
-      EXPECT_EQ((first + again).find("status"), std::string::npos) << states[i];
-      EXPECT_EQ(listing(), sound);
+      EXPECT_TRUE(listing() == sound && (first + again).find("status") == first.npos) << again;
       ends.push_back(std::regex_replace(sound, varies, ""));
       EXPECT_EQ(std::regex_replace(ends[i], icu, ""), std::regex_replace(ends[0], icu, ""));
     }
