@@ -113,8 +113,8 @@ TEST_F(device, the_localtime_link_is_made_to_lead_through_the_store) {
                             {zone + "zoneinfo/../../../..~/zoneinfo/usr/share/zoneinfo", no_zone},
                             {zone + "/usr/share/zoneinf", no_zone},
                             {zone + "/usr/share/zoneinfo", corrected + "\n" + zone + "~/zoneinfo"},
-                            {"~/zoneinfo.default -> /a\n" + zone + "/usr/share/zoneinfo.default",
-                             corrected + ".default\n" + no_zone},
+                            {zone + "/usr/share/zoneinfo.default/+VERSION",
+                             corrected + ".default/+VERSION\n" + no_zone},
                             {"~/localtime/", unread + "~/localtime\n" + no_zone + "- ~/localtime/"},
                             {"~/localtime/full/", unread + "~/localtime\n" + no_default}});
 }
