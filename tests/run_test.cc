@@ -29,6 +29,7 @@ static std::string record(const std::string& of) { return "~/TZVersionDiffRecord
 const std::string reset = on_system + "- ~/icutz\n- /var/db/icutz\n", opt = "~/zoneinfo -> /opt\n";
 const std::string c = "2023c.1.0", newest = "~/tz_latest -> ~/tz/", latest = newest + c + "\n";
 const std::string activated = on(c) + record("2022a.1.0_2023c.1.0");
+const std::string version = "/usr/share/zoneinfo.default/+VERSION = ";
 const std::string legacy = "/var/db/icutz -> ", zone = "~/localtime -> ";
 const std::string paris = zone + "~/zoneinfo/Europe//Paris\n";
 const std::string old_paris = zone + "/usr/share/zoneinfo/Europe//Paris\n";
@@ -52,8 +53,7 @@ const std::string no_default = no_zone + no_link + "localtime to ~/zoneinfo/Amer
                                "Could not reset localtime link\nstatus 1\n- ~/localtime\n";
 
 TEST_F(device, the_newest_usable_data_set_is_selected) {
-  const std::string vs_c = " vs. 2023c.1.0\n", bad = no_version("2022a.1.1.0");
-  const std::string version = "/usr/share/zoneinfo.default/+VERSION = ";
+  const std::string vs_c = " vs. 2023c.1.0\n", bad = no_version("9a.1.1.0");
   expect(usual + latest,
          {{"~/zoneinfo -> ~/tz/2022b/", on(c) + record("2022b_2023c.1.0")},
           {version + "02023c", not_newer + c + " vs. 02023c.1.0\n"},
@@ -66,7 +66,8 @@ TEST_F(device, the_newest_usable_data_set_is_selected) {
           {on("2022z") + newest + "2022b", rejected + not_newer + "2022b vs. 2022z\n" + reset},
           {on("2022a.1.0"), no_data + "2022a.1.0\n" + rejected + activated},
           // Names that are no version, and numbers too large.
-          {version + "2022a.1", bad + bad + on(c) + record("2022a.1.1.0_2023c.1.0")},
+          {version + "9a.1\n" + on("2022z"),
+           bad + rejected + bad + on(c) + record("9a.1.1.0_2023c.1.0")},
           {on(c) + newest + "2022b/", no_version("2022b/") + not_newer + "2022b/" + vs_c},
           {version + "99999999999a\n~/tz_latest = file", unable + not_reset + "status 1\n"},
           {on("2022b") + newest + "2023c.99999999999", unable + reset}});
@@ -83,10 +84,10 @@ TEST_F(device, what_stands_in_a_links_place_is_replaced_or_reported) {
           {bare + on("x"), no_version("x") + no_data + "x\n" + rejected + reset},
           {on("2022b"), ""},
           {on("2022b") + "- ~/zoneinfo\n" + latest, bad_link + "\n" + invalid + activated},
-          {"~/zoneinfo = file", unread + "~/zoneinfo\n" + invalid + on_system},
+          {version + "\n" + opt, bad + bad_link + "/opt\n" + invalid + bad + bad + on_system},
           {on("2022b") + "~/tz_latest -> tz/2022b", bad_path + unable + reset},
           // Nothing is said of the zoneinfo link, which is not even read.
-          {opt + "~/tz_latest = file", unread + "~/tz_latest\n" + unable + on_system},
+          {"~/zoneinfo = x\n~/tz_latest = x", unread + "~/tz_latest\n" + unable + on_system},
           {latest + legacy + "/a\n~/icutz/", kept_icu + no_icu + unable + kept_icu},
           {latest + "~/TZVersionDiffRecord -> /var/r", on(c) + "/var/r = 2022a.1.0_2023c.1.0"},
           {"- ~/zoneinfo\n~/zoneinfo/\n~/icutz -> /a", unread + "~/zoneinfo\n" + stuck}});
