@@ -133,7 +133,7 @@ struct device : testing::Test {
       if (watch) ::setenv("ASAN_OPTIONS", "abort_on_error=1:detect_leaks=0", 1);
       if (prepare) prepare();
       ::execl("/sbin/emulator", "emulator", "/sbin/kelvane", nullptr);  // Of another machine.
-      ::execl("/sbin/kelvane", "any-name", "-n", "--version", nullptr);
+      ::execl("/sbin/kelvane", "any-name", "--version", "-n", nullptr);
     };
     return outcome(run, watch).append(listing());
   }
