@@ -31,7 +31,7 @@ namespace kelvane {
 namespace fs = std::filesystem;
 using text_pairs = std::vector<std::pair<std::string, std::string>>;
 using action = std::function<void()>;
-// Decides about each system call of a run, by its name: 0 lets it go on, an error number fail.
+// Answers each system call of a run, given its name: 0 lets it happen, an error number fails it.
 using watcher = std::function<int(const std::string& call)>;
 
 struct device : testing::Test {
@@ -39,7 +39,7 @@ struct device : testing::Test {
   void SetUp() override {
     static const bool entered = ::chroot(KELVANE_ROOT) == 0 && ::chdir("/") == 0;
     ASSERT_TRUE(entered) << "be root, or start this by: unshare --map-root-user";
-    ::umask(020);  // Unlike any mode that a program would ask for.
+    ::umask(020);  // Leaves modes that no program would ask for.
     prepare_warnings();
   }
 
@@ -114,7 +114,7 @@ struct device : testing::Test {
       std::exit(0);
     };
     watch ? watch_calls(watch, start) : start();
-    // What follows a call that failed is about the same error.
+    // The line after one about a failed call ends in the same error text.
     static const std::regex other_error("(remove|link): .*: ([^:]*)\n.*: (?!\\2\n)[^:]*\n");
     EXPECT_FALSE(std::regex_search(content("/said"), other_error)) << content("/said");
     const int code = WIFSIGNALED(status) ? 128 + WTERMSIG(status) : WEXITSTATUS(status);
@@ -141,7 +141,7 @@ struct device : testing::Test {
   // Boots a device of each first text, which gives the second: what is said, then what changes.
   static void expect(const std::string& base, const text_pairs& table, const watcher& watch = {},
                      const action& prepare = {}) {
-    // Then with longer numbers in versions and schemas: no text has a limit.
+    // Then with longer numbers in versions and schemas: neither has a limit.
     for (const std::string& zeros : {std::string(), std::string(200, '0')})
       for (auto [before, after] : table) {
         before = base + before + "\n", after = before + after;
@@ -152,8 +152,8 @@ struct device : testing::Test {
       }
   }
 
-  // Does `start` in a thread whose calls, and those of the program that it starts, the kernel holds
-  // until they are answered: `watch` decides from where main() ignores SIGPIPE.
+  // Does `start` in a thread. The kernel holds the calls of the thread and of the program started;
+  // here they are let go, from main()'s ignoring of SIGPIPE on as `watch` decides.
   static void watch_calls(const watcher& watch, const action& start) {
 #ifdef KELVANE_SECCOMP
     const scmp_filter_ctx filter = seccomp_init(SCMP_ACT_NOTIFY);
@@ -166,7 +166,7 @@ struct device : testing::Test {
       loaded.set_value(seccomp_load(filter) == 0 ? seccomp_notify_fd(filter) : 1 << 30);
       start();
     });
-    // Nothing else may allocate here: the thread may hold the lock. No descriptor is 1 << 30.
+    // Before the run nothing here may allocate: the thread may hold the lock. 1 << 30 is not open.
     pollfd listener = {loaded.get_future().get(), POLLIN, 0};
     for (__u32 ours = 0; ::poll(&listener, 1, -1) == 1 && listener.revents == POLLIN;) {
       seccomp_notif call = {};
@@ -174,6 +174,7 @@ struct device : testing::Test {
       if (call.data.nr == SCMP_SYS(rt_sigaction) && call.data.args[0] == SIGPIPE) ours = call.pid;
       seccomp_notif_resp answer = {call.id, 0, 0, SECCOMP_USER_NOTIF_FLAG_CONTINUE};
       if (call.pid == ours) {
+        // Root may do all, so that only the call itself shows what exists() asks for.
         EXPECT_TRUE(call.data.nr != SCMP_SYS(access) || call.data.args[1] == F_OK);
         char* const name = seccomp_syscall_resolve_num_arch(call.data.arch, call.data.nr);
         if (const int error = watch(name); error != 0) answer = {call.id, 0, -error, 0};

@@ -33,7 +33,7 @@ TEST_F(device, what_fails_warns_throws_and_changes_nothing) {
   EXPECT_EQ(listing(), text(old + "/var/new -> ..//x/\n/var/db/"));
   const std::string longest(1024, 'x');
   fs::create_symlink(longest + "y", "/var/long");
-  EXPECT_EQ(outcome([] { warn("%s", read_symlink("/var/long").c_str()); }), longest + "\n");
+  EXPECT_EQ(read_symlink("/var/long"), longest);
   EXPECT_TRUE(read_symlink("/var/no/x").empty() && exists("/var/dir") && !exists("/var/dead"));
 }
 
@@ -42,8 +42,8 @@ TEST_F(device, the_first_word_lies_between_white_space_of_any_kind) {
   const text_pairs table = {
       {high, high}, {gap + "2023c", "2023c"}, {std::string(9000, ' ') + high + "\rx", high},
       {gap, ""},    {"#\v2023d" + gap, "#"},  {pages + "\t" + pages, pages}};
-  for (const auto& [content, word] : table) {
-    std::ofstream("/file") << content;
+  for (const auto& [held, word] : table) {
+    std::ofstream("/file") << held;
     EXPECT_EQ(first_word("/file"), word);
   }
   build("/var/link -> /file");
@@ -52,20 +52,20 @@ TEST_F(device, the_first_word_lies_between_white_space_of_any_kind) {
   for (const char* path : {"/var", "/var/missing", "/var/pipe"}) EXPECT_EQ(first_word(path), "");
 }
 
-struct shown_version : tz_version {  // Says what it holds at its end.
+struct shown_version : tz_version {  // Says at its end what it holds, so also after parse() threw.
   using tz_version::tz_version;
   ~shown_version() { warn("%d %s %d %d", year, letters.c_str(), major, minor); }
 };
 
 TEST_F(device, a_version_text_is_parsed_up_to_a_number_too_large) {
-  const std::string many(100000, 'z'), above = "\nSt12out_of_range stoi";
+  const std::string many(100000, 'z'), too_large = "\nSt12out_of_range stoi";
   text_pairs table = {{"2016a.1.0", "2016 a 1 0"},
                       {"02016ab.3", "2016 ab 3 -1"},
                       {"2147483647z.2147483647.02147483647", "2147483647 z 2147483647 2147483647"},
                       {"1" + many, "1 " + many + " -1 -1"},
-                      {"2147483648b", "1 x 1 1" + above},
-                      {"2017b.2147483648", "2017 b 1 1" + above},
-                      {"2017b.2.2147483648", "2017 b 2 1" + above}};
+                      {"2147483648b", "1 x 1 1" + too_large},
+                      {"2017b.2147483648", "2017 b 1 1" + too_large},
+                      {"2017b.2.2147483648", "2017 b 2 1" + too_large}};
   for (const char* text : {"", "a", "2016", "2016A", "2016a.", "2016a.1.2.3", " 2016a", "2016a ",
                            "a2016", "2016\xe9", "2016a.-1", "2016a1", "2016ax1", "2016a.1x0"})
     table.emplace_back(text, no_version(text) + "-1  -1 -1");
@@ -112,7 +112,7 @@ TEST_F(device, a_path_below_the_downloads_names_a_data_set) {
 
 TEST_F(device, the_schema_is_in_the_name_of_a_readable_file_directly_in_the_directory) {
   static constexpr char data[] = "/var/db/timezone/tz/1a/icutz/icutz44l.dat";
-  // With this schema on the system, and this entry in a download: what is said, and if they match.
+  // With this schema on the system, and this entry in a download: what is said, then the answer.
   const auto matches = [](const std::string& wanted, const std::string& schema,
                           const std::string& entry, const action& edit = {}) {
     build("/usr/share/icu/icutzformat.txt = " + schema + "\n~/tz/1a/icutz" + entry);

@@ -8,8 +8,8 @@
 
 namespace kelvane {
 
-// The system partition and the downloads, which no run changes. 2022z has another schema; what
-// 2023c.1.0 has besides its data file must not be read.
+// The system partition and the downloads, which no run changes. 2022z has another schema; neither
+// icutzformat.txt nor +VERSION of 2023c.1.0 may count, and no other data set has a zone.
 const std::string data = R"(
     /usr/share/zoneinfo.default/+VERSION = 2022a
     /usr/share/icu/icutzformat.txt = 44l and more
@@ -72,7 +72,7 @@ TEST_F(device, the_newest_usable_data_set_is_selected) {
           {on("99999999999a"), unable + reset}});
 }
 
-TEST_F(device, what_stands_in_a_links_place_is_replaced_or_reported) {
+TEST_F(device, what_cannot_be_used_is_replaced_or_reported) {
   const std::string bad = no_version(".1.0"), again = bad + no_system, sub = no_version("9a.1.1.0");
   const std::string bad_path = "orv_dataset::create_components: bad path tz/2022b\n";
   const std::string bare = "- /usr/share/icu/icutzformat.txt\n/usr/share/icu/icutz44l.dat = \n";
@@ -127,21 +127,20 @@ static void limit(decltype(RLIMIT_AS) resource, rlim_t value) {
 TEST_F(device, surroundings_change_nothing_else) {
   static constexpr char file[] = "/var/db/timezone/TZVersionDiffRecord";
   static constexpr char* no_arguments[] = {nullptr};
+  // A sanitizer and an emulator have descriptors of their own.
   static const rlim_t files = KELVANE_SANITIZED || fs::exists("/sbin/emulator") ? 9 : 1;
   const std::string store = data + on_system + latest;
-  const text_pairs said = {{"", no_zone + activated}}, unsaid = {{"", pacific + activated}};
-  // A sanitizer and an emulator have descriptors of their own.
-  expect(store, unsaid, {}, [] { ::close_range(0, 2, 0), limit(RLIMIT_NOFILE, files); });
+  const text_pairs loud = {{"", no_zone + activated}}, quiet = {{"", pacific + activated}};
+  expect(store, quiet, {}, [] { ::close_range(0, 2, 0), limit(RLIMIT_NOFILE, files); });
   // Standard error without a reader, then one that may not grow, like the record.
   static int ends[2];
-  expect(store, unsaid, {}, [] { ::pipe(ends), ::close(ends[0]), ::dup2(ends[1], 2); });
+  expect(store, quiet, {}, [] { ::pipe(ends), ::close(ends[0]), ::dup2(ends[1], 2); });
   expect(store, {{"", pacific + activated + record("")}}, {}, [] { limit(RLIMIT_FSIZE, 0); });
-  expect(store, said, {}, [] { limit(RLIMIT_STACK, 256 << 10); });
-  expect(store, said, {}, [] { limit(RLIMIT_AS, KELVANE_SANITIZED ? RLIM_INFINITY : 8 << 20); });
-  expect(store, said, {}, [] { ::umask(0777); });
-  expect(store, said, {}, [] { ::mkdir("/cwd", 0), fs::current_path("/cwd"), ::rmdir("/cwd"); });
+  expect(store, loud, {}, [] { limit(RLIMIT_STACK, 256 << 10); });
+  expect(store, loud, {}, [] { limit(RLIMIT_AS, KELVANE_SANITIZED ? RLIM_INFINITY : 8 << 20); });
+  expect(store, loud, {}, [] { ::mkdir("/cwd", 0), fs::current_path("/cwd"), ::rmdir("/cwd"); });
   expect(store, {{"", no_zone + on(c) + file + " ?"}}, {}, [] { ::mkfifo(file, 0); });
-  expect(store, said, {}, [] { ::execv("/sbin/kelvane", no_arguments); });
+  expect(store, loud, {}, [] { ::execv("/sbin/kelvane", no_arguments); });
   EXPECT_EQ(fs::status("/var/db/timezone").permissions(), fs::perms(0757));
   EXPECT_TRUE(fs::status(file).permissions() == fs::perms(0646) && content(file).back() == '0');
 }
@@ -154,9 +153,9 @@ struct disturbed_run : device {
     if (states.empty()) GTEST_SKIP() << "the system calls of a run cannot be watched here";
   }
 
-  // Lets the call of this number fail, of those whose names begin so, and all after it if asked.
-  std::string failed;
+  std::string failed;  // The names of the calls that were made to fail, without a gap.
   int error = EIO;
+  // Fails the call of this number of those whose names begin so; `onward`, all after it as well.
   watcher failing(const std::string& names, int number = 1, bool onward = false) {
     failed.clear();
     const std::regex begin("^(" + names + ")");
@@ -167,7 +166,7 @@ struct disturbed_run : device {
     };
   }
 
-  // What the device held before each call, without repetition: all that a power cut can leave.
+  // What the device held before each call, without repetition: a power cut leaves one of these.
   std::vector<std::string> states;
   const watcher note = [this](const std::string&) {
     const std::string now = listing();
@@ -179,7 +178,7 @@ struct disturbed_run : device {
 TEST_F(disturbed_run, says_what_failed_and_goes_on) {
   const std::string kept_legacy = kept + "/var/db/icutz\nunlink of ICU softlink failed\n";
   const std::string unlisted = no_data + c + "\n" + not_newer + c + " vs. 2022a.1.0\n";
-  for (error = EINTR; error <= ELOOP; ++error) {
+  for (error = EINTR; error <= ELOOP; ++error) {  // ENOENT, absence, is below EINTR.
     expect(usual, {{latest, unread + "~/tz_latest\n" + unable}}, failing("readlink"));
     expect(usual, {{latest + legacy + "/a", kept_legacy + activated}}, failing("unlink", 4));
     expect(usual, {{latest, on(c) + record("")}}, failing("write"));
@@ -219,9 +218,8 @@ TEST_F(disturbed_run, says_each_line_at_once_and_changes_links_in_this_order) {
   EXPECT_EQ(history, wanted);
 }
 
-// A power cut leaves what the device holds before a call: nothing need be killed to see it.
 TEST_F(disturbed_run, leaves_what_the_next_run_puts_right) {
-  // With the number of states from which other links come: the ICU link, which no run reads, stays.
+  // Each device, and how many of its states end with another ICU link, or none: no run repairs it.
   const std::pair<std::string, int> table[] = {
       {"- ~/zoneinfo\n- ~/localtime\n" + latest, 2},
       {latest, 1},
@@ -232,9 +230,9 @@ TEST_F(disturbed_run, leaves_what_the_next_run_puts_right) {
       {latest + on(c) + old_paris + "/var/db/icu = file\n", 1},
       {opt + latest, 1}};
   const std::regex varies(".*Record .*\n|Europe//Paris|America/Los_Angeles"), icu(".*e/icutz .*\n");
-  for (const auto& [before, left_behind] : table) {
+  for (const auto& [before, unrepaired] : table) {
     states = {text(usual + before)};
-    // Each call fails once, then it and all after it, but those by which a sanitizer ends a run.
+    // Each call fails once, then it and all after it, but those by which it may end.
     for (int number = 2; number == 2 || failed != ""; ++number) {
       build(states[0]);
       const std::string got = boot(failing("(?!rt_|sig|gett|tgk)", number / 2, number % 2 == 1));
@@ -246,12 +244,12 @@ TEST_F(disturbed_run, leaves_what_the_next_run_puts_right) {
     std::vector<std::string> ends;
     for (std::size_t i = 0; i < states.size(); ++i) {
       build(states[i]);
-      const std::string first = boot(note), sound = listing(), again = boot(failing("symlink"));
+      const auto first = boot(note), sound = listing(), again = boot(failing("symlink", 1, true));
       EXPECT_TRUE(listing() == sound && (first + again).find("status") == first.npos) << again;
       ends.push_back(std::regex_replace(sound, varies, ""));
       EXPECT_EQ(std::regex_replace(ends[i], icu, ""), std::regex_replace(ends[0], icu, ""));
     }
-    EXPECT_EQ(std::ranges::count(ends, ends[0]) + left_behind, states.size()) << before;
+    EXPECT_EQ(std::ranges::count(ends, ends[0]) + unrepaired, states.size()) << before;
   }
 }
 
