@@ -132,7 +132,8 @@ TEST_F(device, surroundings_change_nothing_else) {
   const std::string store = data + on_system + latest;
   const text_pairs loud = {{"", no_zone + activated}}, quiet = {{"", pacific + activated}};
   expect(store, quiet, {}, [] { ::close_range(0, 2, 0), limit(RLIMIT_NOFILE, files); });
-  // Standard error without a reader, then one that may not grow, like the record.
+  // No standard error, one without a reader, then one that may not grow, like the record.
+  expect(store, quiet, {}, [] { ::close(2); });
   static int ends[2];
   expect(store, quiet, {}, [] { ::pipe(ends), ::close(ends[0]), ::dup2(ends[1], 2); });
   expect(store, {{"", pacific + activated + record("")}}, {}, [] { limit(RLIMIT_FSIZE, 0); });
