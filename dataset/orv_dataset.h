@@ -20,7 +20,7 @@ inline constexpr char downloads_directory[] = "/var/db/timezone/tz/";
 bool is_below_downloads(const std::string& path);
 
 // A data set, named by its directory: the empty string for the system partition, otherwise
-// `downloads_directory` and the version text. No operation changes it; copies share the components.
+// `downloads_directory` and the version text. No operation changes it.
 class orv_dataset {
  public:
   // The system partition's data set; warns and throws as the next one does.

@@ -26,7 +26,6 @@ class orv_dataset_component {
   virtual void activate() const = 0;
 
  protected:
-  orv_dataset_component() = default;
   explicit orv_dataset_component(const std::string& directory) : dataset_path(directory) {}
   ~orv_dataset_component() = default;
 

@@ -6,7 +6,7 @@
 #include <cerrno>
 #include <cstring>
 #include <memory>
-#include <regex>
+#include <vector>
 
 #include "foundation/byte_regex.h"
 #include "foundation/file_system.h"
@@ -16,6 +16,8 @@
 namespace kelvane {
 namespace {
 
+constexpr char system_icu[] = "/usr/share/icu";
+
 // Otherwise a large file, or one from after 2038, could be neither opened nor seen.
 static_assert(sizeof(off_t) >= 8 && sizeof(time_t) >= 8);
 
@@ -24,13 +26,15 @@ struct fts_closer {
 };
 using fts_handle = std::unique_ptr<FTS, fts_closer>;
 
+// On 32-bit machines glibc checks a directory that it changes to with a stat(2) of its own, whose
+// times have 32 bits: one from after 2038 could not be read. So it stays where it is there.
+constexpr int stay_on_32_bits = sizeof(long) < 8 ? FTS_NOCHDIR : 0;
+
 // The entries come in the directory's own order, the root followed if it is a link, others not.
-// FTS_NOCHDIR, because glibc checks a directory that it enters with a stat(2) of its own, whose
-// times have 32 bits on 32-bit machines: one from after 2038 could not be read.
 fts_handle open_traversal(const std::string& root) {
   std::string root_argument = root;
   char* const roots[] = {root_argument.data(), nullptr};
-  constexpr int options = FTS_COMFOLLOW | FTS_NOCHDIR | FTS_PHYSICAL | FTS_XDEV;
+  constexpr int options = FTS_COMFOLLOW | FTS_PHYSICAL | FTS_XDEV | stay_on_32_bits;
   fts_handle traversal(::fts_open(roots, options, nullptr));
   if (traversal == nullptr) {
     const int error = errno;
@@ -47,15 +51,14 @@ bool may_be_data_file(const FTSENT& entry) {
 
 // The schema in the name of the first data file directly in `directory`; empty where there is none.
 std::string find_schema(const std::string& directory) {
-  const byte_regex pattern("icutz([0-9]+[lbe])\\.dat", byte_regex_grammar);
+  const std::wregex pattern = byte_regex(L"icutz([0-9]+[lbe])\\.dat");
   const fts_handle traversal = open_traversal(directory);
   std::string schema;
   for (const FTSENT* entry = nullptr;
        (entry = ::fts_read(traversal.get())) != nullptr && schema.empty();) {
-    std::cmatch name;
-    if (may_be_data_file(*entry) && std::regex_match(entry->fts_name, name, pattern)) {
-      schema = name.str(1);
-    }
+    if (!may_be_data_file(*entry)) continue;
+    const std::vector<std::string> name = full_match(entry->fts_name, pattern);
+    if (!name.empty()) schema = name[1];
   }
   return schema;
 }

@@ -15,9 +15,6 @@ inline constexpr char icu_link[] = "/var/db/timezone/icutz";
 // Where that link was in an older layout of the store.
 inline constexpr char legacy_icu_link[] = "/var/db/icutz";
 
-// The ICU directory of the system partition.
-inline constexpr char system_icu[] = "/usr/share/icu";
-
 // An ICU directory, DIRECTORY/icutz for a data set in DIRECTORY, with the schema of its data: a
 // number and one of the letters l, b and e, such as 44l. Schemas are texts: 44l and 044l differ.
 class orv_icu final : public orv_dataset_component {

@@ -9,6 +9,11 @@
 #include "foundation/warning.h"
 
 namespace kelvane {
+namespace {
+
+constexpr char latest_link[] = "/var/db/timezone/tz_latest";
+
+}  // namespace
 
 void reset_to_system_partition() { orv_dataset().activate(); }
 

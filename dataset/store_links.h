@@ -10,16 +10,13 @@
 
 namespace kelvane {
 
-// The store's link to the newest download; other software writes it.
-inline constexpr char latest_link[] = "/var/db/timezone/tz_latest";
-
 // Makes the links select the system partition's data set: the zoneinfo link is made anew, the ICU
 // link and the legacy ICU link are removed. Throws what the data set's construction and activate()
 // throw.
 void reset_to_system_partition();
 
-// The target of `latest_link` as it is, or empty when there is no such link. Warns and throws as
-// read_symlink() does.
+// The target of "/var/db/timezone/tz_latest", by which other software names the newest download,
+// as it is; empty when there is no such link. Warns and throws as read_symlink() does.
 std::string latest_dataset_path();
 
 // The directory of the data set that the zoneinfo link selects. Warns and throws as read_symlink()

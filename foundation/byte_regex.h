@@ -4,38 +4,36 @@
 #define KELVANE_FOUNDATION_BYTE_REGEX_H_
 
 #include <regex>
+#include <string>
+#include <vector>
 
 namespace kelvane {
 
-// The traits of a regular expression in which a byte equals only itself. std::regex_traits asks the
-// locale about each of 256 bytes for each bracket of a pattern, which makes the pattern more than
-// ten times as dear to build. These never ask: named classes ([:alpha:], \d) and equivalence
-// classes ([=a=]) are not supported.
-struct byte_traits : std::regex_traits<char> {
-  bool isctype(char, char_class_type) const { return false; }
-  // The library's own reads the digit from a stream.
-  int value(char digit, int) const { return digit - '0'; }
-
-  template <class Iterator>
-  string_type transform_primary(Iterator, Iterator) const {
-    return {};
-  }
-  template <class Iterator>
-  char_class_type lookup_classname(Iterator, Iterator, bool = false) const {
-    return {};
-  }
-};
-
-using byte_regex = std::basic_regex<char, byte_traits>;
-
-// The ECMAScript grammar. libstdc++'s default matcher recurses for each character, so that a long
-// text overflows the stack; the matcher that this flag of its own selects does not.
+// The compiled form of `pattern`, in the ECMAScript grammar, for full_match(). Wide, because
+// libstdc++ tabulates 256 answers of the locale for each bracket of a narrow pattern, which makes
+// it twice as dear to build, and none for a wide one.
+inline std::wregex byte_regex(const wchar_t* pattern) {
 #ifdef __GLIBCXX__
-inline constexpr auto byte_regex_grammar =
-    std::regex_constants::ECMAScript | std::regex_constants::__polynomial;
+  // The default matcher recurses for each character, so that a long text overflows the stack; the
+  // matcher that this flag selects does not.
+  return std::wregex(pattern, std::regex::ECMAScript | std::regex_constants::__polynomial);
 #else
-inline constexpr auto byte_regex_grammar = std::regex_constants::ECMAScript;
+  return std::wregex(pattern);
 #endif
+}
+
+// What `pattern` finds if it matches all of `text`: the text, then that of each group, empty for a
+// group that took no part. No texts at all if it does not match.
+//
+// Example: "icutz44l.dat" and L"icutz([0-9]+[lbe])\\.dat" give "icutz44l.dat" and "44l".
+inline std::vector<std::string> full_match(const std::string& text, const std::wregex& pattern) {
+  const std::wstring wide(text.begin(), text.end());
+  std::wsmatch groups;
+  std::regex_match(wide, groups, pattern);
+  std::vector<std::string> texts;
+  for (const std::wssub_match& group : groups) texts.emplace_back(group.first, group.second);
+  return texts;
+}
 
 }  // namespace kelvane
 

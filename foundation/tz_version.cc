@@ -1,8 +1,8 @@
 #include "foundation/tz_version.h"
 
-#include <regex>
 #include <stdexcept>
 #include <tuple>
+#include <vector>
 
 #include "foundation/byte_regex.h"
 #include "foundation/warning.h"
@@ -10,8 +10,8 @@
 namespace kelvane {
 namespace {
 
-std::int32_t sub_version(const std::ssub_match& group) {
-  return group.matched ? std::stoi(group.str()) : -1;
+std::int32_t sub_version(const std::string& number) {
+  return number.empty() ? -1 : std::stoi(number);
 }
 
 }  // namespace
@@ -20,16 +20,15 @@ tz_version::tz_version(const std::string& text) { parse(text); }
 
 void tz_version::parse(const std::string& text) {
   try {
-    const byte_regex pattern("([0-9]+)([a-z]+)(?:\\.([0-9]+))?(?:\\.([0-9]+))?",
-                             byte_regex_grammar);
-    std::smatch results;
-    if (!std::regex_match(text, results, pattern)) {
+    const std::wregex pattern = byte_regex(L"([0-9]+)([a-z]+)(?:\\.([0-9]+))?(?:\\.([0-9]+))?");
+    const std::vector<std::string> results = full_match(text, pattern);
+    if (results.empty()) {
       warn("Cannot parse version string %s, results.size() = %d", text.c_str(),
            static_cast<int>(results.size()));
       throw std::invalid_argument("no match");
     }
-    year = std::stoi(results.str(1));
-    letters = results.str(2);
+    year = std::stoi(results[1]);
+    letters = results[2];
     major = sub_version(results[3]);
     minor = sub_version(results[4]);
   } catch (const std::invalid_argument&) {

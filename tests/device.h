@@ -23,7 +23,7 @@
 #include <map>
 #include <sstream>
 
-#include "foundation/byte_regex.h"
+#include <regex>
 #include "foundation/warning.h"
 
 namespace kelvane {
@@ -92,7 +92,8 @@ struct device : testing::Test {
 
   // What was last said, without the program's name and the error texts, nor what counts coverage.
   static std::string said() {
-    static const byte_regex line("kelvane: (.*): .*(\n)|LLVM .*\n", byte_regex_grammar);
+    static const std::regex line("kelvane: (.*): .*(\n)|LLVM .*\n",
+                                 std::regex::ECMAScript | std::regex_constants::__polynomial);
     return std::regex_replace(content("/said"), line, "$1$2");
   }
 
