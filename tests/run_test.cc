@@ -1,257 +1,278 @@
-// The program as a whole: its warnings, its exit status and what it leaves.
-
-#include <sys/resource.h>
-
-#include <algorithm>
+// What a start of a device says and changes.
 
 #include "tests/device.h"
 
 namespace kelvane {
 
-// The system partition and the downloads, which no run changes. 2022z has another schema; neither
-// icutzformat.txt nor +VERSION of 2023c.1.0 may count, and no other data set has a zone.
-const std::string data = R"(
-    /usr/share/zoneinfo.default/+VERSION = 2022a
-    /usr/share/icu/icutzformat.txt = 44l and more
-    ~/tz/2022z/icutz/icutz44b.dat = data
-    ~/tz/2022b/icutz/icutz44l.dat = data
-    ~/tz/2023c.1.0/icutz/icutz44l.dat = data
-    ~/tz/2023c.1.0/icutz/icutzformat.txt = 9l
-    ~/tz/2023c.1.0/zoneinfo/+VERSION = 2030a
-    ~/tz/2023c.1.0/zoneinfo/Europe/Paris = TZif
-)";
-// Entries, then messages. What does not end in a newline wants the rest.
-const std::string on_system = "~/zoneinfo -> /usr/share/zoneinfo.default\n";
-static std::string on(const std::string& version) {
-  return "~/zoneinfo -> ~/tz/" + version + "/zoneinfo\n~/icutz -> ~/tz/" + version + "/icutz\n";
-}
-static std::string record(const std::string& of) { return "~/TZVersionDiffRecord = " + of + "\n"; }
-const std::string reset = on_system + "- ~/icutz\n- /var/db/icutz\n", opt = "~/zoneinfo -> /opt\n";
-const std::string c = "2023c.1.0", newest = "~/tz_latest -> ~/tz/", latest = newest + c + "\n";
-const std::string activated = on(c) + record("2022a.1.0_2023c.1.0");
-const std::string version = "/usr/share/zoneinfo.default/+VERSION = ";
-const std::string legacy = "/var/db/icutz -> ", zone = "~/localtime -> ";
-const std::string paris = zone + "~/zoneinfo/Europe//Paris\n";
-const std::string old_paris = zone + "/usr/share/zoneinfo/Europe//Paris\n";
-const std::string pacific = zone + "~/zoneinfo/America/Los_Angeles\n";
-const std::string usual = data + on_system + paris + record("longer than what is written now");
-
-const std::string invalid = "Invalid current symlinks; resetting to system partition\n";
-const std::string rejected = "Symlink points at data incompatible with installed system\n";
-const std::string not_newer = "New update not compatible or older version: ";
-const std::string unable = "Unable to locate data; resetting to system partition\n";
-const std::string not_reset = "Could not reset to system partition\n";
-const std::string no_zone = "localtime link invalid; resetting to America/Los_Angeles\n" + pacific;
-const std::string corrected = "Correcting localtime link to ~/zoneinfo";
-const std::string no_data = "No ICU schema found for ~/tz/";
-const std::string kept = "remove: could not remove ", unread = "read_symlink: ";
-const std::string no_link = "create_symlink: from ~/", bad_link = "Bad zoneinfo link ";
-const std::string no_system = no_link + "zoneinfo to /usr/share/zoneinfo.default\n";
-const std::string fails = kept + "~/zoneinfo\nUnlink of zoneinfo softlink failed\n" + no_system;
-const std::string stuck = invalid + fails + unable + fails + not_reset + "status 1\n";
-const std::string no_default = no_zone + no_link + "localtime to ~/zoneinfo/America/Los_Angeles\n" +
-                               "Could not reset localtime link\nstatus 1\n- ~/localtime\n";
-
-TEST_F(device, the_newest_usable_data_set_is_selected) {
-  const std::string vs_c = " vs. 2023c.1.0\n";
-  expect(usual + latest,
-         {{"~/zoneinfo -> ~/tz/2022b/", on(c) + record("2022b_2023c.1.0")},
-          {version + "02023c", not_newer + c + " vs. 02023c.1.0\n"},
-          {version + "2023c\n" + on(c), not_newer + c + vs_c},
-          {newest + "2022z", not_newer + "2022z vs. 2022a.1.0\n"},
-          // A rejected data set is still what an update is compared with.
-          {version + "02024b\n" + on("2022b"), rejected + on(c) + record("02024b.1.0_2023c.1.0")},
-          {legacy + "/a\n" + version + "2024b\n" + on(c), rejected + not_newer + c + vs_c + reset},
-          {on("2022z") + newest + "2022b", rejected + not_newer + "2022b vs. 2022z\n" + reset},
-          {on("2022a.1.0") + newest + "9a", no_data + "2022a.1.0\n" + rejected + no_data + "9a\n" +
-                                                not_newer + "9a vs. 2022a.1.0\n" + reset},
-          // Names that are no version, and numbers too large.
-          {on(c) + newest + "2022b/", no_version("2022b/") + not_newer + "2022b/" + vs_c},
-          {version + "99999999999a\n~/tz_latest = file", unable + not_reset + "status 1\n"},
-          {on("2022b") + newest + "2023c.99999999999", unable + reset},
-          {on("99999999999a"), unable + reset}});
+// Expects what the start of a device says and, as entries instead of others, what it changes.
+void expect(const std::string& device, const std::string& said, const std::string& changes) {
+  build(device + changes);
+  const std::string wanted = said + listing();
+  build(device);
+  const std::string told = start();
+  EXPECT_EQ(told + listing(), wanted) << "on the device\n" << device;
 }
 
-TEST_F(device, what_cannot_be_used_is_replaced_or_reported) {
-  const std::string bad = no_version(".1.0"), again = bad + no_system, sub = no_version("9a.1.1.0");
-  const std::string bad_path = "orv_dataset::create_components: bad path tz/2022b\n";
-  const std::string bare = "- /usr/share/icu/icutzformat.txt\n/usr/share/icu/icutz44l.dat = \n";
-  const std::string no_icu = no_link + "icutz to ~/tz/2023c.1.0/icutz\n";
-  const std::string kept_icu = kept + "~/icutz\nunlink of ICU softlink failed\n";
-  expect(usual,
-         {{bare + newest + "2026a", no_data + "2026a\n" + on("2026a") + record("2022a.1.0_2026a")},
-          {bare + on("x"), no_version("x") + no_data + "x\n" + rejected + reset},
-          {version + "9a.1\n" + on("2022z"), sub + rejected + sub + reset},
-          {on("2022b"), ""},
-          {on("2022b") + "- ~/zoneinfo\n" + latest, bad_link + "\n" + invalid + activated},
-          {version + "\n" + opt, bad + bad_link + "/opt\n" + invalid + bad + bad + on_system},
-          {on("2022b") + "~/tz_latest -> tz/2022b", bad_path + unable + reset},
-          // Nothing is said of the zoneinfo link, which is not even read.
-          {"~/zoneinfo = x\n~/tz_latest = x", unread + "~/tz_latest\n" + unable + on_system},
-          {latest + legacy + "/a\n~/icutz/", kept_icu + no_icu + unable + kept_icu},
-          {latest + "~/TZVersionDiffRecord -> /var/r", on(c) + "/var/r = 2022a.1.0_2023c.1.0"},
-          {"- ~/zoneinfo\n~/zoneinfo/\n~/icutz -> /a", unread + "~/zoneinfo\n" + stuck}});
-  expect("", {{"/var/db/",
-               bad + bad_link + "\n" + invalid + again + unable + again + not_reset + no_default}});
-}
-
-TEST_F(device, the_legacy_icu_link_is_carried_over_unless_there_is_a_new_one) {
-  const std::string at = "/var/db/icutz\n", gone = "- " + at;
-  const std::string failed = "Could not migrate /var/db/icutz to ~/icutz\n";
-  expect(usual, {{legacy + "../../usr", gone + "~/icutz -> ../../usr"},
-                 {"/var/db/icutz = file\n~/icutz -> /var\n/var/db/icu/", gone + "- /var/db/icu/"},
-                 {legacy + "/usr\n~/icutz -> /a", no_link + "icutz to /usr\n" + failed + gone},
-                 {"/var/db/icutz = file", unread + at + failed + gone},
-                 {legacy + "/a\n/var/db/icu/full/", ""},
-                 {"/var/db/icutz/", unread + at + failed + kept + at + "Could not remove " + at}});
-}
-
-TEST_F(device, the_localtime_link_is_made_to_lead_through_the_store) {
-  expect(data + on_system, {{zone + "~/zoneinfo", ""},
-                            {zone + "~/zoneinfoX/../No/Zone", ""},
-                            {zone + "~/zoneinf", no_zone},
-                            {zone + "zoneinfo/../../../..~/zoneinfo/usr/share/zoneinfo", no_zone},
-                            {zone + "/usr/share/zoneinf", no_zone},
-                            {zone + "/usr/share/zoneinfo", corrected + "\n" + zone + "~/zoneinfo"},
-                            {zone + "/usr/share/zoneinfo.default/+VERSION",
-                             corrected + ".default/+VERSION\n" + no_zone},
-                            {"~/localtime/", unread + "~/localtime\n" + no_zone + "- ~/localtime/"},
-                            {"~/localtime/full/", unread + "~/localtime\n" + no_default}});
-}
-
-static void limit(decltype(RLIMIT_AS) resource, rlim_t value) {
-  const rlimit limits = {value, value};
-  ::setrlimit(resource, &limits);
-}
-
-TEST_F(device, surroundings_change_nothing_else) {
-  static constexpr char file[] = "/var/db/timezone/TZVersionDiffRecord";
-  static constexpr char* no_arguments[] = {nullptr};
-  // A sanitizer and an emulator have descriptors of their own.
-  static const rlim_t files = KELVANE_SANITIZED || fs::exists("/sbin/emulator") ? 9 : 2;
-  const std::string store = data + on_system + latest;
-  const text_pairs loud = {{"", no_zone + activated}}, quiet = {{"", pacific + activated}};
-  expect(store, quiet, {}, [] { ::close_range(0, 2, 0), limit(RLIMIT_NOFILE, files); });
-  // No standard error, one without a reader, then one that may not grow, like the record.
-  expect(store, quiet, {}, [] { ::close(2); });
-  static int ends[2];
-  expect(store, quiet, {}, [] { ::pipe(ends), ::close(ends[0]), ::dup2(ends[1], 2); });
-  expect(store, {{"", pacific + activated + record("")}}, {}, [] { limit(RLIMIT_FSIZE, 0); });
-  expect(store, loud, {}, [] { limit(RLIMIT_STACK, 256 << 10); });
-  expect(store, loud, {}, [] { limit(RLIMIT_AS, KELVANE_SANITIZED ? RLIM_INFINITY : 8 << 20); });
-  expect(store, loud, {}, [] { ::mkdir("/cwd", 0), fs::current_path("/cwd"), ::rmdir("/cwd"); });
-  expect(store, {{"", no_zone + on(c) + file + " ?"}}, {}, [] { ::mkfifo(file, 0); });
-  expect(store, loud, {}, [] { ::execv("/sbin/kelvane", no_arguments); });
-  EXPECT_EQ(fs::status("/var/db/timezone").permissions(), fs::perms(0757));
-  EXPECT_TRUE(fs::status(file).permissions() == fs::perms(0646) && content(file).back() == '0');
-}
-
-// Runs whose system calls are watched.
-struct disturbed_run : device {
-  void SetUp() override {
-    device::SetUp();
-    build(""), boot(note);
-    if (states.empty()) GTEST_SKIP() << "the system calls of a run cannot be watched here";
-  }
-
-  std::string failed;  // The names of the calls that were made to fail, without a gap.
-  int error = EIO;
-  // Fails the call of this number of those whose names begin so; `onward`, all after it as well.
-  watcher failing(const std::string& names, int number = 1, bool onward = false) {
-    failed.clear();
-    const std::regex begin("^(" + names + ")");
-    return [=, this, left = number](const std::string& call) mutable {
-      if (!std::regex_search(call, begin) || --left > 0 || (left < 0 && !onward)) return 0;
-      failed += call;
-      return error;
-    };
-  }
-
-  // What the device held before each call, without repetition: a power cut leaves one of these.
-  std::vector<std::string> states;
-  const watcher note = [this](const std::string&) {
-    const std::string now = listing();
-    if (std::ranges::find(states, now) == states.end()) states.push_back(now);
-    return 0;
-  };
-};
-
-TEST_F(disturbed_run, says_what_failed_and_goes_on) {
-  const std::string kept_legacy = kept + "/var/db/icutz\nunlink of ICU softlink failed\n";
-  const std::string unlisted = no_data + c + "\n" + not_newer + c + " vs. 2022a.1.0\n";
-  for (error = EINTR; error <= ELOOP; ++error) {  // ENOENT, absence, is below EINTR.
-    expect(usual, {{latest, unread + "~/tz_latest\n" + unable}}, failing("readlink"));
-    expect(usual, {{latest + legacy + "/a", kept_legacy + activated}}, failing("unlink", 4));
-    expect(usual, {{latest, on(c) + record("")}}, failing("write"));
-    expect(usual, {{legacy + "/usr", "- /var/db/icutz"}}, failing("access|faccess"));
-    expect(usual, {{"", no_version(".1.0")}}, failing("open", 3));
-    expect(usual, {{latest, activated}}, failing("read$", 2));
-    expect(usual, {{latest, unlisted}}, failing("open", 9));
-    expect(usual, {{latest, unlisted}}, failing("getdents"));
-    expect(usual,
-           {{on("2022z"), rejected + no_system + unable + reset},
-            {latest, no_link + "zoneinfo to ~/tz/2023c.1.0/zoneinfo\n" + unable},
-            {zone + "/usr/share/zoneinfo/No", corrected + "/No\n" + no_default},
-            {on(c) + old_paris, corrected + "/Europe//Paris\n" + no_link +
-                                    "localtime to ~/zoneinfo/Europe//Paris\n" + no_zone}},
-           failing("symlink"));
-    // A store that has become read-only.
-    expect(usual, {{"~/zoneinfo = file", unread + "~/zoneinfo\n" + stuck}},
-           failing("symlink|unlink|rmdir", 1, true));
-  }
-}
-
-TEST_F(disturbed_run, says_each_line_at_once_and_changes_links_in_this_order) {
-  std::string now = usual + on("2022z") + "- ~/icutz\n" + latest + old_paris + legacy +
-                    "/usr\n/var/db/icu -> /no\n";
-  build(now);
-  std::vector<std::string> wanted = {text(now)}, history = wanted;
-  const watcher observe = [&](const std::string&) {
-    if (said() + listing() != history.back()) history.push_back(said() + listing());
-    return 0;
-  };
-  boot(observe), observe("exit");
-  for (const std::string& change : lines_of(
-           "~/icutz -> /usr\n- /var/db/icutz\n- /var/db/icu\n" + rejected + "- ~/zoneinfo\n" +
-           on_system + "- ~/icutz\n- ~/zoneinfo\n" + on(c) + record("") +
-           record("2022a.1.0_2023c.1.0") + corrected + "/Europe//Paris\n- ~/localtime\n" + paris))
-    wanted.push_back(text(now += change + "\n"));
-  EXPECT_EQ(history, wanted);
-}
-
-TEST_F(disturbed_run, leaves_what_the_next_run_puts_right) {
-  // Each device, and how many of its states end with another ICU link, or none: no run repairs it.
-  const std::pair<std::string, int> table[] = {
-      {"- ~/zoneinfo\n- ~/localtime\n" + latest, 2},
-      {latest, 1},
-      {on("2022b") + latest, 2},
-      {on("2022z") + latest, 2},
-      {on("2022z") + newest + "2022z\n", 1},
-      {on(c) + "- ~/icutz\n" + legacy + "~/tz/2023c.1.0/icutz\n" + latest, 1},
-      {latest + on(c) + old_paris + "/var/db/icu = file\n", 1},
-      {opt + latest, 1}};
-  const std::regex varies(".*Record .*\n|Europe//Paris|America/Los_Angeles"), icu(".*e/icutz .*\n");
-  for (const auto& [before, unrepaired] : table) {
-    states = {text(usual + before)};
-    // Each call fails once, then it and all after it, but those by which it may end.
-    for (int number = 2; number == 2 || failed != ""; ++number) {
-      build(states[0]);
-      const std::string got = boot(failing("(?!rt_|sig|gett|tgk)", number / 2, number % 2 == 1));
-      // A run that is short of memory may end by a signal.
-      const bool memory = std::regex_search(failed, std::regex("brk|mmap"));
-      EXPECT_TRUE(memory || !std::regex_search(got, std::regex("status (?!1\n)"))) << got;
-      note("exit");
+// A row is a device: the release of its system partition, to what its links lead, and its newest
+// download; then what its start gives. What the links led to can be "rejected", and the download
+// "refused", which has to be newer than that even where it was rejected.
+TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
+  std::istringstream rows(R"(
+  //  +VERSION  zoneinfo   tz_latest  said              in use     record
+      2022a     2022b      -          -                 2022b      -
+      2023c     2023c.1.0  -          -                 2023c.1.0  -
+      2022b     2022b      -          rejected          system     -
+      2022a     system     2023c.1.0  -                 2023c.1.0  2022a.1.0_2023c.1.0
+      2022a     2022b      2023c.1.0  -                 2023c.1.0  2022b_2023c.1.0
+      2022a     2023c.1.0  2023c.1.0  refused           2023c.1.0  -
+      2022a     2023c.1.0  2022b      refused           2023c.1.0  -
+      2022a     system     2022z      refused           system     -
+      02023c    system     2023c.1.0  refused           system     -
+      2024b     2023c.1.0  2023c.1.0  rejected,refused  system     -
+      2024b     2022b      2023c.1.0  rejected          2023c.1.0  2024b.1.0_2023c.1.0
+      2022a     2022z      2022b      rejected,refused  system     -
+      2022a     2022z      2026z      rejected,refused  system     -
+      2022a     2022z      2023c.1.0  rejected          2023c.1.0  2022a.1.0_2023c.1.0
+  )");
+  std::string system, current, latest, said, used, record;
+  std::getline(rows.ignore(), record);
+  while (rows >> system >> current >> latest >> said >> used >> record) {
+    std::string device = usual + "/usr/share/zoneinfo.default/+VERSION = " + system + "\n";
+    device += links_to(current);
+    if (latest != "-") device += "~/tz_latest -> ~/tz/" + latest + "\n";
+    std::string messages;
+    if (said.starts_with("rejected")) {
+      messages += "| Symlink points at data incompatible with installed system\n";
     }
-    std::vector<std::string> ends;
-    for (std::size_t i = 0; i < states.size(); ++i) {
-      build(states[i]);
-      const auto first = boot(note), sound = listing(), again = boot(failing("symlink", 1, true));
-      EXPECT_TRUE(listing() == sound && (first + again).find("status") == first.npos) << again;
-      ends.push_back(std::regex_replace(sound, varies, ""));
-      EXPECT_EQ(std::regex_replace(ends[i], icu, ""), std::regex_replace(ends[0], icu, ""));
+    if (said.ends_with("refused")) {
+      messages += "| New update not compatible or older version: " + latest + " vs. ";
+      messages += (current == "system" ? system + ".1.0" : current) + "\n";
     }
-    EXPECT_EQ(std::ranges::count(ends, ends[0]) + unrepaired, states.size()) << before;
+    std::string changes = links_to(used);
+    if (record != "-") changes += "~/TZVersionDiffRecord = " + record;
+    expect(device, messages, changes);
   }
+}
+
+// The entries that "a{b, c}d" stands for: "abd" and "acd".
+std::vector<std::string> alternatives(const std::string& entry) {
+  std::smatch part;
+  if (!std::regex_match(entry, part, std::regex("(.*)\\{(.*)\\}(.*\n)"))) return {entry};
+  std::vector<std::string> result;
+  std::istringstream choices(part.str(2));
+  for (std::string choice; std::getline(choices >> std::ws, choice, ',');) {
+    result.push_back(part.str(1) + choice + part.str(3));
+  }
+  return result;
+}
+
+// Expects that stories are so, with a blank line between them: what a device has besides the usual,
+// and what a start does to it. Alternatives in the last entry are a device each, of which "*" in a
+// message is the target.
+void expect_stories(const std::string& stories) {
+  const std::size_t gap = stories.find("\n\n");
+  if (gap != stories.npos) expect_stories(stories.substr(gap + 2));
+  std::string entries, last, said, changes;
+  std::istringstream lines(stories.substr(0, gap));
+  for (std::string line; std::getline(lines >> std::ws, line);) {
+    if (line[0] == '|') said += line + "\n";
+    else if (line[0] == '-') changes += "no " + line.substr(2) + "\n";
+    else if (line[0] == '+') changes += line.substr(2) + "\n";
+    else entries += std::exchange(last, line + "\n");
+  }
+  for (const std::string& entry : alternatives(last)) {
+    const std::string target = std::regex_replace(entry, std::regex(".* -> |\n"), "");
+    expect(usual + entries + entry, std::regex_replace(said, std::regex("\\*"), target), changes);
+  }
+}
+
+TEST(a_start, uses_no_data_that_it_cannot_find_or_that_do_not_fit) {
+  expect_stories(R"(
+      no ~/zoneinfo
+      no ~/localtime
+      ~/tz_latest -> ~/tz/2023c.1.0
+      | Bad zoneinfo link
+      | Invalid current symlinks; resetting to system partition
+      | localtime link invalid; resetting to America/Los_Angeles
+      + ~/TZVersionDiffRecord = 2022a.1.0_2023c.1.0
+      + ~/icutz -> ~/tz/2023c.1.0/icutz
+      + ~/localtime -> ~/zoneinfo/America/Los_Angeles
+      + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
+
+      ~/icutz -> ~/tz/2022b/icutz
+      /var/db/icutz -> icutz
+      ~/zoneinfo -> {tz/2022b/zoneinfo, ~/tz/2022b, ~/tz//zoneinfo, /usr/share/zoneinfo, %n}
+      | Bad zoneinfo link *
+      | Invalid current symlinks; resetting to system partition
+      - ~/icutz
+      - /var/db/icutz
+      + ~/zoneinfo -> /usr/share/zoneinfo.default
+
+      ~/icutz -> /missing
+      ~/zoneinfo/
+      | read_symlink: ~/zoneinfo
+      | Invalid current symlinks; resetting to system partition
+      | remove: could not remove ~/zoneinfo
+      | Unlink of zoneinfo softlink failed
+      | create_symlink: from ~/zoneinfo to /usr/share/zoneinfo.default
+      | Unable to locate data; resetting to system partition
+      | remove: could not remove ~/zoneinfo
+      | Unlink of zoneinfo softlink failed
+      | create_symlink: from ~/zoneinfo to /usr/share/zoneinfo.default
+      | Could not reset to system partition
+      | status 1
+
+      ~/icutz -> ~/tz/2022b/icutz
+      ~/zoneinfo -> ~/tz/2022b/anything
+      ~/tz_latest -> {tz/2023c.1.0, ~/tz/, ~/tzdata/2023c, /~/tz/2023c.1.0}
+      | orv_dataset::create_components: bad path *
+      | Unable to locate data; resetting to system partition
+      - ~/icutz
+      + ~/zoneinfo -> /usr/share/zoneinfo.default
+
+      ~/zoneinfo = file
+      ~/tz_latest = file
+      | read_symlink: ~/tz_latest
+      | Unable to locate data; resetting to system partition
+      + ~/zoneinfo -> /usr/share/zoneinfo.default
+
+      ~/zoneinfo -> ~/tz//2023c.1.0/zoneinfo
+      ~/tz_latest -> ~/tz//2023c.1.0/
+      | Cannot parse version string /2023c.1.0, results.size() = 0
+      | Cannot parse version string /2023c.1.0
+      | Symlink points at data incompatible with installed system
+      | Cannot parse version string /2023c.1.0/, results.size() = 0
+      | Cannot parse version string /2023c.1.0/
+      | New update not compatible or older version: /2023c.1.0/ vs. /2023c.1.0
+      + ~/zoneinfo -> /usr/share/zoneinfo.default
+
+      /usr/share/zoneinfo.default/+VERSION = 99999999999a
+      | Unable to locate data; resetting to system partition
+      | Could not reset to system partition
+      | status 1
+
+      ~/tz_latest -> ~/tz/2026a
+      ~/tz/2026a/icutz/icutz44l{.dat.bak = -, xdat = -, .dat/x = -, .dat -> /usr, .dat = not for others}
+      | No ICU schema found for ~/tz/2026a
+      | New update not compatible or older version: 2026a vs. 2022a.1.0
+
+      no /usr/share/icu/icutzformat.txt
+      ~/TZVersionDiffRecord/
+      ~/tz_latest -> ~/tz/2026a
+      ~/tz/2026a/icutz -> icutz
+      | No ICU schema found for ~/tz/2026a
+      + ~/icutz -> ~/tz/2026a/icutz
+      + ~/zoneinfo -> ~/tz/2026a/zoneinfo
+  )");
+}
+
+TEST(a_start, makes_links_anew_and_carries_over_those_of_the_older_layout) {
+  expect_stories(R"(
+      /var/db/icutz -> /missing
+      ~/icutz = file
+      ~/TZVersionDiffRecord -> /var/record
+      ~/localtime -> /usr/share/zoneinfo/Europe//Paris
+      ~/tz_latest -> ~/tz/2023c.1.0
+      | Correcting localtime link to ~/zoneinfo/Europe//Paris
+      - /var/db/icutz
+      + /var/record = 2022a.1.0_2023c.1.0
+      + ~/icutz -> ~/tz/2023c.1.0/icutz
+      + ~/localtime -> ~/zoneinfo/Europe//Paris
+      + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
+
+      /var/db/icutz -> icutz
+      ~/icutz/
+      ~/tz_latest -> ~/tz/2023c.1.0
+      | remove: could not remove ~/icutz
+      | unlink of ICU softlink failed
+      | create_symlink: from ~/icutz to ~/tz/2023c.1.0/icutz
+      | Unable to locate data; resetting to system partition
+      | remove: could not remove ~/icutz
+      | unlink of ICU softlink failed
+
+      /var/db/icu = file
+      /var/db/icutz -> icu
+      - /var/db/icu
+      - /var/db/icutz
+      + ~/icutz -> icu
+
+      ~/icutz -> /usr
+      /var/db/icutz = file
+      /var/db/{icu/, icu -> missing}
+      - /var/db/icu
+      - /var/db/icutz
+
+      /var/db/icutz -> /usr
+      ~/icutz -> /missing
+      | create_symlink: from ~/icutz to /usr
+      | Could not migrate /var/db/icutz to ~/icutz
+      - /var/db/icutz
+
+      /var/db/icu/full/
+      /var/db/icutz/
+      | read_symlink: /var/db/icutz
+      | Could not migrate /var/db/icutz to ~/icutz
+      | remove: could not remove /var/db/icutz
+      | Could not remove /var/db/icutz
+  )");
+}
+
+TEST(a_start, makes_the_local_time_link_lead_through_the_store) {
+  expect_stories(R"(
+      ~/localtime -> {~/zoneinfo, ~/zoneinfoX/No/Zone}
+
+      ~/localtime -> {~/zoneinf, zoneinfo/+VERSION, /var/db/./timezone/zoneinfo/+VERSION}
+      | localtime link invalid; resetting to America/Los_Angeles
+      + ~/localtime -> ~/zoneinfo/America/Los_Angeles
+
+      ~/{localtime = file, localtime/}
+      | read_symlink: ~/localtime
+      | localtime link invalid; resetting to America/Los_Angeles
+      + ~/localtime -> ~/zoneinfo/America/Los_Angeles
+
+      /usr/share/zoneinfo.default/%n -> missing
+      ~/localtime -> /usr/share/zoneinfo/%n
+      | Correcting localtime link to ~/zoneinfo/%n
+      | localtime link invalid; resetting to America/Los_Angeles
+      + ~/localtime -> ~/zoneinfo/America/Los_Angeles
+
+      ~/localtime -> /usr/share/zoneinfo.default/+VERSION
+      | Correcting localtime link to ~/zoneinfo.default/+VERSION
+      | localtime link invalid; resetting to America/Los_Angeles
+      + ~/localtime -> ~/zoneinfo/America/Los_Angeles
+  )");
+}
+
+TEST(a_start, cuts_the_target_of_a_link_after_1024_bytes) {
+  const std::string story = R"(
+      ~/tz_latest -> ~/tz/2023cZEROSmore
+      | No ICU schema found for ~/tz/2023cZEROS
+      | New update not compatible or older version: 2023cZEROS vs. 2022a.1.0
+  )";
+  expect_stories(std::regex_replace(story, std::regex("ZEROS"), "." + std::string(998, '0')));
+}
+
+TEST(a_start, ends_each_line_with_the_last_error) {
+  build(usual + links_to("2023c.1.0") + "~/tz_latest -> ~/tz/2023c.1.0");
+  start();
+  EXPECT_EQ(content("/said"),
+            "kelvane: New update not compatible or older version: 2023c.1.0 vs. 2023c.1.0: "
+            "No such file or directory\n");
+  build(usual + "/var/db/icu/full/\n ~/tz_latest -> ~/tz/2023c.1.0\n no ~/zoneinfo");
+  fs::create_symlink("new\nline", "/var/db/timezone/zoneinfo");
+  start();
+  EXPECT_EQ(content("/said"),
+            "kelvane: Bad zoneinfo link new\nline: Directory not empty\n"
+            "kelvane: Invalid current symlinks; resetting to system partition: "
+            "Directory not empty\n");
+}
+
+TEST(a_start, is_the_same_where_nobody_reads_what_it_says) {
+  build(usual + "no ~/localtime");
+  int ends[2];
+  ASSERT_EQ(::pipe(ends), 0);
+  ::close(ends[0]);
+  EXPECT_EQ(start({}, [&] { ::dup2(ends[1], STDERR_FILENO); }), "");
 }
 
 }  // namespace kelvane
