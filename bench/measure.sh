@@ -17,6 +17,8 @@ put_links_back="find $store -maxdepth 1 ! -type d -delete; cp -a /links/. $store
 # The links, and what the record holds.
 list_store() { find $store -maxdepth 1 ! -type d -printf '%f %l\n' -type f -exec cat {} \; | sort; }
 
+afresh() { sh -c "$put_links_back" && "$@"; }
+
 row() { printf '%-15s  %-12s  %5s  %5s  %5s  %11s\n' "$@"; }
 
 measure() { # case, program
@@ -24,14 +26,11 @@ measure() { # case, program
   hyperfine --shell=none --warmup 20 --runs 500 --prepare "sh -c '$put_links_back'" \
     --export-csv /times "/sbin/$2" &>/dev/null
   time=$(awk -F , 'NR == 2 {printf "%.2f", $4 * 1000}' /times)
-  sh -c "$put_links_back"
-  command time --format %M --output /memory "/sbin/$2" 2>/dev/null
-  sh -c "$put_links_back"
-  strace -f -qq -e signal=none -o /calls "/sbin/$2" 2>/dev/null
+  afresh command time --format %M --output /memory "/sbin/$2" 2>/dev/null
+  afresh strace -f -qq -e signal=none -o /calls "/sbin/$2" 2>/dev/null
   calls=$(grep -vc ' resumed>' /calls)
-  sh -c "$put_links_back"
-  env -i valgrind.bin --tool=callgrind --trace-children=yes --callgrind-out-file=/callgrind.%p \
-    "/sbin/$2" 2>/dev/null
+  afresh env -i valgrind.bin --tool=callgrind --trace-children=yes \
+    --callgrind-out-file=/callgrind.%p "/sbin/$2" 2>/dev/null
   instructions=$(sed -n 's/^totals: //p' /callgrind.* | paste -sd +)
   rm /callgrind.*
   row "$1" "$2" "$time" "$(</memory)" "$calls" "$((instructions))"
