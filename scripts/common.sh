@@ -36,15 +36,22 @@ need_packages() {
   ((${#missing[@]} > 0)) || return 0
   ((EUID == 0)) || fail "packages are missing; as root: apt-get install ${missing[*]}"
   echo "Installing ${missing[*]}"
-  local install=(apt-get install --yes --no-install-recommends --no-remove "${missing[@]}")
-  # Fails where the package lists are missing or older than the archive.
-  "${install[@]}" &>/dev/null && return
-  quietly apt-get update
-  quietly "${install[@]}"
+  # Without the lists that are out of reach, those at hand may do.
+  apt-get update &>/dev/null || true
+  quietly apt-get install --yes --no-install-recommends --no-remove "${missing[@]}"
+}
+
+build_preset() {
+  echo "Building build/$1"
+  quietly cmake --preset "$1"
+  quietly cmake --build --preset "$1"
 }
 
 # Throw-away roots lie under build/, where programs may run. Root enters one, or a user who is root
 # in a namespace of their own; containers may withhold either.
+as_root=()
+((EUID == 0)) || as_root=(unshare --map-root-user)
+
 need_throw_away_roots() {
   { mkdir -p build 2>/dev/null && [[ -w build ]]; } || fail "this checkout is not writable; copy it"
   in_root / true 2>/dev/null && return
@@ -52,6 +59,11 @@ need_throw_away_roots() {
   fail "an ordinary user gets no user namespace here (unshare --map-root-user); run it as root"
 }
 
-in_root() { # root directory, command
-  if ((EUID == 0)); then chroot "$@"; else unshare --map-root-user chroot "$@"; fi
+in_root() { "${as_root[@]}" chroot "$@"; } # root directory, command
+
+# Replaces the script by a command whose mounts end with it.
+exec_with_own_mounts() {
+  "${as_root[@]}" unshare --mount true 2>/dev/null || fail "nothing can be mounted here: a" \
+    "container needs CAP_SYS_ADMIN; a chroot, a root that is a mount (mount --bind ROOT ROOT)"
+  exec "${as_root[@]}" unshare --mount "$@"
 }
