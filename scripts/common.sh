@@ -63,7 +63,7 @@ in_root() { "${as_root[@]}" chroot "$@"; } # root directory, command
 
 # Replaces the script by a command whose mounts end with it.
 exec_with_own_mounts() {
-  "${as_root[@]}" unshare --mount true 2>/dev/null || fail "nothing can be mounted here: a" \
-    "container needs CAP_SYS_ADMIN; a chroot, a root that is a mount (mount --bind ROOT ROOT)"
+  "${as_root[@]}" unshare --mount true 2>/dev/null || fail "nothing can be mounted here:" \
+    "a container needs CAP_SYS_ADMIN, and a chroot must be a mount (mount --bind ROOT ROOT)"
   exec "${as_root[@]}" unshare --mount "$@"
 }
