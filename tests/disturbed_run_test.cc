@@ -66,6 +66,19 @@ bool is_sound_but_for_caveats(const std::string& device, const std::string& want
   return std::regex_replace(device, caveats, "") == std::regex_replace(wanted, caveats, "");
 }
 
+// Whether the example icu-link.conf makes the ICU link follow the zoneinfo link, and no link where
+// that is so.
+bool icu_link_can_follow(const std::string& device) {
+  const bool downloaded = device.find("~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo\n") != device.npos;
+  build(device + links_to(downloaded ? "2023c.1.0" : "system"));
+  const std::string wanted = listing();
+  const fs::file_time_type untouched = fs::last_write_time("/var/db/timezone");
+  const bool idle = std::system("sh /sbin/icu-link.sh") == 0 &&
+                    fs::last_write_time("/var/db/timezone") == untouched;
+  build(device);
+  return idle && std::system("sh /sbin/icu-link.sh") == 0 && listing() == wanted;
+}
+
 TEST(a_disturbed_run, leaves_what_the_next_run_puts_right) {
   for (const std::string current : {"system", "2022b", "2022z", "2023c.1.0"}) {
     const std::string device = usual + links_to(current) + R"(
@@ -83,6 +96,7 @@ TEST(a_disturbed_run, leaves_what_the_next_run_puts_right) {
       const std::string sound = repaired(left);
       EXPECT_TRUE(is_sound_but_for_caveats(sound, wanted)) << left << "becomes\n" << sound;
       EXPECT_TRUE(has_nothing_to_do(sound)) << sound;
+      EXPECT_TRUE(icu_link_can_follow(sound)) << sound;
       // The run that puts it right can be cut short as well.
       for (const std::string& further : left_by_power_cuts(left)) {
         if (!seen.contains(further)) found.insert(further);
