@@ -1,16 +1,13 @@
-// A device in a throw-away root directory, told as text.
-//
-// What it has, one entry a line. "~" is /var/db/timezone; of directories only empty ones count.
+// A device in a throw-away root directory, told as text. What it has, one entry a line; "~" is
+// /var/db/timezone, and of directories only the empty ones are entries:
 //   ~/a/link -> its target
 //   ~/a/file = its content
 //   ~/a/directory/
 //   no ~/a/path
-//
-// What a start does to it:
-//   | what is said, without the program's name and the error text
-//   | status 1, unless it is 0; 128 and its number for a signal
-//   - ~/a/path that goes
-//   + ~/a/link -> what comes or changes
+// What a start says, without the program's name and the error text, and its status unless it is 0,
+// which is 128 and its number for a signal:
+//   | read_symlink: ~/a/file
+//   | status 1
 
 #ifndef KELVANE_TESTS_DEVICE_H_
 #define KELVANE_TESTS_DEVICE_H_
@@ -23,16 +20,14 @@
 
 #include <filesystem>
 #include <fstream>
+#include <functional>
 #include <regex>
 #include <set>
 #include <sstream>
 
-#include "tests/system_calls.h"
-
 namespace kelvane {
 
 namespace fs = std::filesystem;
-using action = std::function<void()>;
 
 struct throw_away_root : testing::Environment {
   void SetUp() override {
@@ -98,7 +93,6 @@ inline std::string listing() {
       const std::string path = entry.path();
       if (entry.is_symlink()) entries.insert(path + " -> " + fs::read_symlink(path).string());
       else if (entry.is_regular_file()) entries.insert(path + " = " + content(path));
-      else if (!entry.is_directory()) entries.insert(path + " is something else");
       else if (fs::is_empty(path)) entries.insert(path + "/");
     }
   }
@@ -107,19 +101,16 @@ inline std::string listing() {
   return std::regex_replace(result, std::regex("/var/db/timezone"), "~");
 }
 
-[[noreturn]] inline void become_the_program(const watcher& watch, const action& prepare) {
-  ::dup2(::open("/said", O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0600), STDERR_FILENO);
-  ::alarm(60);  // Ends a run that hangs, with status 142.
-  if (prepare) prepare();
-  if (watch) std::exit(run_watched(watch));
-  ::execl("/sbin/emulator", "emulator", "/sbin/kelvane", nullptr);  // Of another machine.
-  ::execl("/sbin/kelvane", "any-name", "--version", "-n", nullptr);
-  std::abort();
-}
-
 // Starts the device, after `prepare` in the program's process: what that says, and its status.
-inline std::string start(const watcher& watch = {}, const action& prepare = {}) {
-  if (::fork() == 0) become_the_program(watch, prepare);
+inline std::string start(const std::function<void()>& prepare = [] {}) {
+  if (::fork() == 0) {
+    ::dup2(::open("/said", O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0600), STDERR_FILENO);
+    ::alarm(60);  // Ends a run that hangs, with status 142.
+    prepare();
+    ::execl("/sbin/emulator", "emulator", "/sbin/kelvane", nullptr);  // Of another machine.
+    ::execl("/sbin/kelvane", "any-name", "--version", "-n", nullptr);
+    std::abort();
+  }
   int status = 0;
   ::wait(&status);
   std::string told;

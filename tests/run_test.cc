@@ -19,13 +19,11 @@ void expect(const std::string& device, const std::string& said, const std::strin
 TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
   std::istringstream rows(R"(
   //  +VERSION  zoneinfo   tz_latest  said              in use     record
-      2022a     2022b      -          -                 2022b      -
       2023c     2023c.1.0  -          -                 2023c.1.0  -
       2022b     2022b      -          rejected          system     -
       2022a     system     2023c.1.0  -                 2023c.1.0  2022a.1.0_2023c.1.0
       2022a     2022b      2023c.1.0  -                 2023c.1.0  2022b_2023c.1.0
       2022a     2023c.1.0  2023c.1.0  refused           2023c.1.0  -
-      2022a     2023c.1.0  2022b      refused           2023c.1.0  -
       2022a     system     2022z      refused           system     -
       02023c    system     2023c.1.0  refused           system     -
       2024b     2023c.1.0  2023c.1.0  rejected,refused  system     -
@@ -54,21 +52,19 @@ TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
   }
 }
 
-// The entries that "a{b, c}d" stands for: "abd" and "acd".
-std::vector<std::string> alternatives(const std::string& entry) {
-  std::smatch part;
-  if (!std::regex_match(entry, part, std::regex("(.*)\\{(.*)\\}(.*\n)"))) return {entry};
-  std::vector<std::string> result;
-  std::istringstream choices(part.str(2));
-  for (std::string choice; std::getline(choices >> std::ws, choice, ',');) {
-    result.push_back(part.str(1) + choice + part.str(3));
-  }
-  return result;
+// The choices between the braces of an entry, "a" and "b" in "{a, b}"; "" if it has none.
+std::vector<std::string> choices_in(const std::string& entry) {
+  std::smatch braces;
+  if (!std::regex_search(entry, braces, std::regex("\\{(.*)\\}"))) return {""};
+  std::vector<std::string> choices;
+  std::istringstream text(braces.str(1));
+  for (std::string choice; std::getline(text >> std::ws, choice, ',');) choices.push_back(choice);
+  return choices;
 }
 
 // Expects that stories are so, with a blank line between them: what a device has besides the usual,
-// and what a start does to it. Alternatives in the last entry are a device each, of which "*" in a
-// message is the target.
+// what a start says, the paths that go ("-") and what comes or changes ("+"). Choices in the last
+// entry of the device are a device each; "*" is the choice.
 void expect_stories(const std::string& stories) {
   const std::size_t gap = stories.find("\n\n");
   if (gap != stories.npos) expect_stories(stories.substr(gap + 2));
@@ -78,11 +74,14 @@ void expect_stories(const std::string& stories) {
     if (line[0] == '|') said += line + "\n";
     else if (line[0] == '-') changes += "no " + line.substr(2) + "\n";
     else if (line[0] == '+') changes += line.substr(2) + "\n";
-    else entries += std::exchange(last, line + "\n");
+    else {
+      entries += last;
+      last = line + "\n";
+    }
   }
-  for (const std::string& entry : alternatives(last)) {
-    const std::string target = std::regex_replace(entry, std::regex(".* -> |\n"), "");
-    expect(usual + entries + entry, std::regex_replace(said, std::regex("\\*"), target), changes);
+  for (const std::string& choice : choices_in(last)) {
+    const std::string entry = std::regex_replace(last, std::regex("\\{.*\\}"), choice);
+    expect(usual + entries + entry, std::regex_replace(said, std::regex("\\*"), choice), changes);
   }
 }
 
@@ -145,11 +144,6 @@ TEST(a_start, uses_no_data_that_it_cannot_find_or_that_do_not_fit) {
       | Cannot parse version string /2023c.1.0/
       | New update not compatible or older version: /2023c.1.0/ vs. /2023c.1.0
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-
-      /usr/share/zoneinfo.default/+VERSION = 99999999999a
-      | Unable to locate data; resetting to system partition
-      | Could not reset to system partition
-      | status 1
 
       ~/tz_latest -> ~/tz/2026a
       ~/tz/2026a/icutz/icutz44l{.dat.bak = -, xdat = -, .dat/x = -, .dat -> /usr, .dat = not for others}
@@ -231,25 +225,17 @@ TEST(a_start, makes_the_local_time_link_lead_through_the_store) {
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
 
       /usr/share/zoneinfo.default/%n -> missing
-      ~/localtime -> /usr/share/zoneinfo/%n
-      | Correcting localtime link to ~/zoneinfo/%n
-      | localtime link invalid; resetting to America/Los_Angeles
-      + ~/localtime -> ~/zoneinfo/America/Los_Angeles
-
-      ~/localtime -> /usr/share/zoneinfo.default/+VERSION
-      | Correcting localtime link to ~/zoneinfo.default/+VERSION
+      ~/localtime -> /usr/share/zoneinfo{/%n, .default/+VERSION}
+      | Correcting localtime link to ~/zoneinfo*
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
   )");
 }
 
 TEST(a_start, cuts_the_target_of_a_link_after_1024_bytes) {
-  const std::string story = R"(
-      ~/tz_latest -> ~/tz/2023cZEROSmore
-      | No ICU schema found for ~/tz/2023cZEROS
-      | New update not compatible or older version: 2023cZEROS vs. 2022a.1.0
-  )";
-  expect_stories(std::regex_replace(story, std::regex("ZEROS"), "." + std::string(998, '0')));
+  build(usual);
+  fs::create_symlink("/var/db/timezone/tz/" + std::string(2000, '1'), "/var/db/timezone/tz_latest");
+  EXPECT_NE(start().find(": " + std::string(1004, '1') + " vs. 2022a.1.0\n"), std::string::npos);
 }
 
 TEST(a_start, ends_each_line_with_the_last_error) {
@@ -261,10 +247,9 @@ TEST(a_start, ends_each_line_with_the_last_error) {
   build(usual + "/var/db/icu/full/\n ~/tz_latest -> ~/tz/2023c.1.0\n no ~/zoneinfo");
   fs::create_symlink("new\nline", "/var/db/timezone/zoneinfo");
   start();
-  EXPECT_EQ(content("/said"),
-            "kelvane: Bad zoneinfo link new\nline: Directory not empty\n"
-            "kelvane: Invalid current symlinks; resetting to system partition: "
-            "Directory not empty\n");
+  EXPECT_TRUE(content("/said").starts_with(
+      "kelvane: Bad zoneinfo link new\nline: Directory not empty\n"
+      "kelvane: Invalid current symlinks; resetting to system partition: Directory not empty\n"));
 }
 
 TEST(a_start, is_the_same_where_nobody_reads_what_it_says) {
@@ -272,7 +257,7 @@ TEST(a_start, is_the_same_where_nobody_reads_what_it_says) {
   int ends[2];
   ASSERT_EQ(::pipe(ends), 0);
   ::close(ends[0]);
-  EXPECT_EQ(start({}, [&] { ::dup2(ends[1], STDERR_FILENO); }), "");
+  EXPECT_EQ(start([&] { ::dup2(ends[1], STDERR_FILENO); }), "");
 }
 
 }  // namespace kelvane

@@ -3,26 +3,25 @@
 #include <sys/types.h>
 
 #include <cerrno>
-#include <regex>
+#include <cstdlib>
 
 int kelvane_main();  // The program's main(), under a name of its own.
 
 namespace {
 
-kelvane::watcher watching;
+std::function<int()> watching;
 
-bool fails(const std::string& call, const char* path) {
-  static const std::regex store("/var/db/timezone");
-  const int error = watching ? watching(call + " " + std::regex_replace(path, store, "~")) : 0;
+bool fails() {
+  const int error = watching ? watching() : 0;
   if (error != 0) errno = error;
   return error != 0;
 }
 
 }  // namespace
 
-int kelvane::run_watched(const watcher& watch) {
+void kelvane::run_watched(const std::function<int()>& watch) {
   watching = watch;
-  return kelvane_main();
+  std::exit(kelvane_main());
 }
 
 // The linker's --wrap gives these the calls of the C library's functions.
@@ -32,12 +31,12 @@ int __real_remove(const char*);
 int __real_symlink(const char*, const char*);
 int __real_unlink(const char*);
 
-ssize_t __wrap_readlink(const char* path, char* buffer, size_t size) {
-  return fails("readlink", path) ? -1 : __real_readlink(path, buffer, size);
+ssize_t __wrap_readlink(const char* path, char* text, size_t size) {
+  return fails() ? -1 : __real_readlink(path, text, size);
 }
-int __wrap_remove(const char* path) { return fails("remove", path) ? -1 : __real_remove(path); }
+int __wrap_remove(const char* path) { return fails() ? -1 : __real_remove(path); }
 int __wrap_symlink(const char* target, const char* path) {
-  return fails("symlink", path) ? -1 : __real_symlink(target, path);
+  return fails() ? -1 : __real_symlink(target, path);
 }
-int __wrap_unlink(const char* path) { return fails("unlink", path) ? -1 : __real_unlink(path); }
+int __wrap_unlink(const char* path) { return fails() ? -1 : __real_unlink(path); }
 }

@@ -4,16 +4,12 @@
 #define KELVANE_TESTS_SYSTEM_CALLS_H_
 
 #include <functional>
-#include <string>
 
 namespace kelvane {
 
-// Is told a call, such as "unlink ~/icutz", and answers 0 to let it happen or the error number with
-// which it fails instead.
-using watcher = std::function<int(const std::string& call)>;
-
-// Runs the program's main() in this process, its calls watched.
-int run_watched(const watcher& watch);
+// Becomes a run before each of whose calls `watch` is asked: 0 lets it happen, an error number
+// makes it fail.
+[[noreturn]] void run_watched(const std::function<int()>& watch);
 
 }  // namespace kelvane
 
