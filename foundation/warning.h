@@ -18,7 +18,8 @@ namespace kelvane {
 // Example: with errno at EISDIR, warn("remove: could not remove %s", "/var/db/icutz") writes
 //   kelvane: remove: could not remove /var/db/icutz: Is a directory
 //
-// The texts of the messages are fixed, oddities included: do not tidy them.
+// The texts of the messages are an interface: those who watch the logs of a fleet search for them,
+// and kelvane(8) explains them word for word. So their oddities stay.
 [[gnu::format(printf, 1, 2)]] void warn(const char* format, ...);
 
 // Makes warn() keep its guarantees, however the process was started: called once, first of all. It

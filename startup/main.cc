@@ -11,7 +11,8 @@
 
 namespace {
 
-// Names the program inside the executable; kept though nothing refers to it.
+// what(1) prints it: so the executable says what it is, also stripped and under another name. As
+// nothing refers to it, compiler and linker would leave it out without the attributes.
 [[gnu::used, gnu::retain]] const char identification[] =
     "@(#)PROGRAM:kelvane  PROJECT:Orvalen-80\n";
 
