@@ -3,11 +3,10 @@
 //   ~/a/link -> its target
 //   ~/a/file = its content
 //   ~/a/directory/
+//   ~/a/pipe|
 //   no ~/a/path
-// What a start says, without the program's name and the error text, and its status unless it is 0,
-// which is 128 and its number for a signal:
-//   | read_symlink: ~/a/file
-//   | status 1
+// What a start says, after "| " and without the program's name and the error text; last its status
+// unless it is 0, as in "| status 1", which for a signal is 128 and its number.
 
 #ifndef KELVANE_TESTS_DEVICE_H_
 #define KELVANE_TESTS_DEVICE_H_
@@ -33,7 +32,6 @@ struct throw_away_root : testing::Environment {
   void SetUp() override {
     ASSERT_TRUE(::chroot(KELVANE_ROOT) == 0 && ::chdir("/") == 0)
         << "be root, or start this by: unshare --map-root-user";
-    ::umask(020);  // Leaves modes that no program would ask for.
   }
 };
 inline const auto* const root = testing::AddGlobalTestEnvironment(new throw_away_root);
@@ -41,9 +39,11 @@ inline const auto* const root = testing::AddGlobalTestEnvironment(new throw_away
 // What each device has unless it says otherwise: links with which nothing is wrong, and data. 2022z
 // and 2026z have another schema than the system partition; only 2023c.1.0 has a time zone.
 inline const std::string usual = R"(
-    /usr/share/zoneinfo.default/+VERSION = 2022a
+    /usr/share/zoneinfo.default/+VERSION -> release
+    /usr/share/zoneinfo.default/release = 2022a
     /usr/share/icu/icutzformat.txt = 44l and more
-    ~/tz/2022b/icutz/icutz44l.dat = data
+    /usr/share/icu/icutz9l.dat = does not count
+    ~/tz/2022b/icutz -> ../2023c.1.0/icutz
     ~/tz/2022z/icutz/icutz44b.dat = data
     ~/tz/2026z/icutz/icutz44b.dat = data
     ~/tz/2023c.1.0/icutz/icutz44l.dat = data
@@ -74,14 +74,15 @@ inline void build(const std::string& entries) {
   std::istringstream lines(std::regex_replace(entries, std::regex("~"), "/var/db/timezone"));
   for (std::string line; std::getline(lines >> std::ws, line);) {
     std::smatch part;
-    std::regex_match(line, part, std::regex("(no )?([^ ]*[^ /])(/| = | -> )?(.*)"));
+    std::regex_match(line, part, std::regex("(no )?([^ ]*[^ /|])(/|[|]| = | -> )?(.*)"));
     const fs::path path = part.str(2);
     fs::remove_all(path);
     if (part[1].matched) continue;
     fs::create_directories(part[3] == "/" ? path : path.parent_path());
     if (part[3] == " = ") std::ofstream(path) << part[4];
     if (part[3] == " -> ") fs::create_symlink(part.str(4), path);
-    if (part[4] == "not for others") fs::permissions(path, fs::perms(0660));
+    if (part[3] == "|") ::mkfifo(path.c_str(), 0644);
+    if (part[4] == "secret") fs::permissions(path, fs::perms(0660));
   }
 }
 
@@ -93,6 +94,7 @@ inline std::string listing() {
       const std::string path = entry.path();
       if (entry.is_symlink()) entries.insert(path + " -> " + fs::read_symlink(path).string());
       else if (entry.is_regular_file()) entries.insert(path + " = " + content(path));
+      else if (entry.is_fifo()) entries.insert(path + "|");
       else if (fs::is_empty(path)) entries.insert(path + "/");
     }
   }

@@ -1,5 +1,9 @@
-// What a start of a device says and changes.
+// What a start of a device says and changes, and two operations of which no start shows it all.
 
+#include <sys/resource.h>
+
+#include "foundation/first_word.h"
+#include "foundation/tz_version.h"
 #include "tests/device.h"
 
 namespace kelvane {
@@ -13,19 +17,17 @@ void expect(const std::string& device, const std::string& said, const std::strin
   EXPECT_EQ(told + listing(), wanted) << "on the device\n" << device;
 }
 
-// A row is a device: the release of its system partition, to what its links lead, and its newest
-// download; then what its start gives. What the links led to can be "rejected", and the download
-// "refused", which has to be newer than that even where it was rejected.
+// A row is a device: the release of its system partition, what its links lead to and its newest
+// download; then what its start gives. "rejected" is what they led to, "refused" the download.
 TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
-  std::istringstream rows(R"(
   //  +VERSION  zoneinfo   tz_latest  said              in use     record
+  std::istringstream rows(R"(
       2023c     2023c.1.0  -          -                 2023c.1.0  -
       2022b     2022b      -          rejected          system     -
       2022a     system     2023c.1.0  -                 2023c.1.0  2022a.1.0_2023c.1.0
       2022a     2022b      2023c.1.0  -                 2023c.1.0  2022b_2023c.1.0
       2022a     2023c.1.0  2023c.1.0  refused           2023c.1.0  -
       2022a     system     2022z      refused           system     -
-      02023c    system     2023c.1.0  refused           system     -
       2024b     2023c.1.0  2023c.1.0  rejected,refused  system     -
       2024b     2022b      2023c.1.0  rejected          2023c.1.0  2024b.1.0_2023c.1.0
       2022a     2022z      2022b      rejected,refused  system     -
@@ -33,11 +35,9 @@ TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
       2022a     2022z      2023c.1.0  rejected          2023c.1.0  2022a.1.0_2023c.1.0
   )");
   std::string system, current, latest, said, used, record;
-  std::getline(rows.ignore(), record);
   while (rows >> system >> current >> latest >> said >> used >> record) {
     std::string device = usual + "/usr/share/zoneinfo.default/+VERSION = " + system + "\n";
-    device += links_to(current);
-    if (latest != "-") device += "~/tz_latest -> ~/tz/" + latest + "\n";
+    device += links_to(current) + (latest == "-" ? "" : "~/tz_latest -> ~/tz/" + latest + "\n");
     std::string messages;
     if (said.starts_with("rejected")) {
       messages += "| Symlink points at data incompatible with installed system\n";
@@ -46,18 +46,17 @@ TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
       messages += "| New update not compatible or older version: " + latest + " vs. ";
       messages += (current == "system" ? system + ".1.0" : current) + "\n";
     }
-    std::string changes = links_to(used);
-    if (record != "-") changes += "~/TZVersionDiffRecord = " + record;
-    expect(device, messages, changes);
+    const std::string written = record == "-" ? "" : "~/TZVersionDiffRecord = " + record;
+    expect(device, messages, links_to(used) + written);
   }
 }
 
 // The choices between the braces of an entry, "a" and "b" in "{a, b}"; "" if it has none.
 std::vector<std::string> choices_in(const std::string& entry) {
   std::smatch braces;
-  if (!std::regex_search(entry, braces, std::regex("\\{(.*)\\}"))) return {""};
+  std::regex_search(entry, braces, std::regex("\\{(.*)\\}|$"));
   std::vector<std::string> choices;
-  std::istringstream text(braces.str(1));
+  std::istringstream text(braces.str(1) + ",");
   for (std::string choice; std::getline(text >> std::ws, choice, ',');) choices.push_back(choice);
   return choices;
 }
@@ -121,12 +120,10 @@ TEST(a_start, uses_no_data_that_it_cannot_find_or_that_do_not_fit) {
       | Could not reset to system partition
       | status 1
 
-      ~/icutz -> ~/tz/2022b/icutz
       ~/zoneinfo -> ~/tz/2022b/anything
       ~/tz_latest -> {tz/2023c.1.0, ~/tz/, ~/tzdata/2023c, /~/tz/2023c.1.0}
       | orv_dataset::create_components: bad path *
       | Unable to locate data; resetting to system partition
-      - ~/icutz
       + ~/zoneinfo -> /usr/share/zoneinfo.default
 
       ~/zoneinfo = file
@@ -145,12 +142,28 @@ TEST(a_start, uses_no_data_that_it_cannot_find_or_that_do_not_fit) {
       | New update not compatible or older version: /2023c.1.0/ vs. /2023c.1.0
       + ~/zoneinfo -> /usr/share/zoneinfo.default
 
+      ~/zoneinfo -> ~/tz/{2147483648a, 18446744073709553632a, 2016b.2147483648, 2016b.2.4294967297}/
+      | Unable to locate data; resetting to system partition
+      + ~/zoneinfo -> /usr/share/zoneinfo.default
+
+      ~/tz_latest -> ~/tz/{a, 2016, 2016A, 2016a., 2016a.1.2.3, 2016a.-1, 2016a1, 2016a..1, tz2016a}
+      | Cannot parse version string *, results.size() = 0
+      | Cannot parse version string *
+      | No ICU schema found for ~/tz/*
+      | New update not compatible or older version: * vs. 2022a.1.0
+
+      /usr/share/zoneinfo.default/+VERSION = {-, 2022a.2.0}
+      | Cannot parse version string *.1.0, results.size() = 0
+      | Cannot parse version string *.1.0
+      | Cannot parse version string *.1.0, results.size() = 0
+      | Cannot parse version string *.1.0
+
       ~/tz_latest -> ~/tz/2026a
-      ~/tz/2026a/icutz/icutz44l{.dat.bak = -, xdat = -, .dat/x = -, .dat -> /usr, .dat = not for others}
+      ~/tz/2026a/icutz/icutz44l{.dat2 = -, xdat = -, .dat/x = -, .dat -> /sbin/kelvane, .dat = secret, .dat|}
       | No ICU schema found for ~/tz/2026a
       | New update not compatible or older version: 2026a vs. 2022a.1.0
 
-      no /usr/share/icu/icutzformat.txt
+      /usr/share/icu/icutzformat.txt|
       ~/TZVersionDiffRecord/
       ~/tz_latest -> ~/tz/2026a
       ~/tz/2026a/icutz -> icutz
@@ -213,9 +226,10 @@ TEST(a_start, makes_links_anew_and_carries_over_those_of_the_older_layout) {
 
 TEST(a_start, makes_the_local_time_link_lead_through_the_store) {
   expect_stories(R"(
+      ~/tz|
       ~/localtime -> {~/zoneinfo, ~/zoneinfoX/No/Zone}
 
-      ~/localtime -> {~/zoneinf, zoneinfo/+VERSION, /var/db/./timezone/zoneinfo/+VERSION}
+      ~/localtime -> {~/zoneinf, zoneinfo/+VERSION, /.~/zoneinfo, ../../../usr/share/zoneinfo}
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
 
@@ -252,12 +266,44 @@ TEST(a_start, ends_each_line_with_the_last_error) {
       "kelvane: Invalid current symlinks; resetting to system partition: Directory not empty\n"));
 }
 
-TEST(a_start, is_the_same_where_nobody_reads_what_it_says) {
-  build(usual + "no ~/localtime");
+TEST(a_start, goes_on_where_it_can_write_neither_a_line_nor_the_record) {
   int ends[2];
   ASSERT_EQ(::pipe(ends), 0);
   ::close(ends[0]);
-  EXPECT_EQ(start([&] { ::dup2(ends[1], STDERR_FILENO); }), "");
+  build(usual + "~/tz_latest -> ~/tz/2023c.1.0\n no ~/localtime");
+  const auto limit = [&] {
+    const rlimit none = {0, 0};
+    ::setrlimit(RLIMIT_FSIZE, &none);
+    ::dup2(ends[1], STDERR_FILENO);
+  };
+  EXPECT_EQ(start(limit), "");
+}
+
+TEST(first_word, lies_between_white_space_of_any_kind) {
+  const std::string blanks(5000, ' '), pages(9000, 'w'), bytes("#\xa0\0\x85", 4);
+  const std::pair<std::string, std::string> words[] = {
+      {blanks + pages + "\f", pages}, {"\t\n\v\f\r" + bytes + "\v2023d", bytes}, {" \n", ""}};
+  for (const auto& [text, word] : words) {
+    std::ofstream("/file") << text;
+    EXPECT_EQ(first_word("/file"), word) << text;
+  }
+}
+
+TEST(versions, are_ordered_by_the_first_field_that_differs) {
+  std::istringstream rising(R"(
+      0a  2015z.9.9  2016a  2016a.0  2016a.1  2016a.1.0  2016a.1.9  2016a.2  2016a.10
+      2016aa  2016b  2016z  2016za  2017a  10000a  2147483647a
+  )");
+  std::vector<tz_version> versions(1);
+  for (std::string text; rising >> text;) versions.emplace_back(text);
+  for (const tz_version& left : versions) {
+    for (const tz_version& right : versions) {
+      EXPECT_EQ(left > right, &left > &right) << left.letters << " " << right.letters;
+      EXPECT_EQ(left == right, &left == &right);
+    }
+  }
+  const std::string many(100000, 'z');
+  EXPECT_EQ(tz_version("02016" + many + ".010"), tz_version("2016" + many + ".10"));
 }
 
 }  // namespace kelvane
