@@ -106,7 +106,7 @@ inline std::string listing() {
 // Starts the device, after `prepare` in the program's process: what that says, and its status.
 inline std::string start(const std::function<void()>& prepare = [] {}) {
   if (::fork() == 0) {
-    ::dup2(::open("/said", O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0600), STDERR_FILENO);
+    ::dup2(::open("/said", O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644), STDERR_FILENO);
     ::alarm(60);  // Ends a run that hangs, with status 142.
     prepare();
     ::execl("/sbin/emulator", "emulator", "/sbin/kelvane", nullptr);  // Of another machine.

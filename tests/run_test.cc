@@ -159,7 +159,7 @@ TEST(a_start, uses_no_data_that_it_cannot_find_or_that_do_not_fit) {
       | Cannot parse version string *.1.0
 
       ~/tz_latest -> ~/tz/2026a
-      ~/tz/2026a/icutz/icutz44l{.dat2 = -, xdat = -, .dat/x = -, .dat -> /sbin/kelvane, .dat = secret, .dat|}
+      ~/tz/2026a/icutz/icutz4l{.dat2 = -, xdat = -, .dat/, .dat -> /said, .dat = secret, .dat|}
       | No ICU schema found for ~/tz/2026a
       | New update not compatible or older version: 2026a vs. 2022a.1.0
 
