@@ -36,8 +36,7 @@ struct throw_away_root : testing::Environment {
 };
 inline const auto* const root = testing::AddGlobalTestEnvironment(new throw_away_root);
 
-// What each device has unless it says otherwise: links with which nothing is wrong, and data. 2022z
-// and 2026z have another schema than the system partition; only 2023c.1.0 has a time zone.
+// What each device has unless it says otherwise: links with which nothing is wrong, and data.
 inline const std::string usual = R"(
     /usr/share/zoneinfo.default/+VERSION -> release
     /usr/share/zoneinfo.default/release = 2022a
