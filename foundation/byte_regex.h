@@ -11,7 +11,7 @@ namespace kelvane {
 
 // The compiled form of `pattern`, in the ECMAScript grammar, for full_match(). Wide, because
 // libstdc++ tabulates 256 answers of the locale for each bracket of a narrow pattern, which makes
-// it twice as dear to build, and none for a wide one.
+// it several times as dear to build, and none for a wide one.
 inline std::wregex byte_regex(const wchar_t* pattern) {
 #ifdef __GLIBCXX__
   // The default matcher recurses for each character, so that a long text overflows the stack; the

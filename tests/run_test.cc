@@ -157,6 +157,7 @@ TEST(a_start, uses_no_data_that_it_cannot_find_or_that_do_not_fit) {
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
 
+      /usr/share/icu/icutzformat.txt = anything
       ~/tz_latest -> ~/tz/2026a
       ~/tz/2026a/icutz/icutz4l{.dat2 = -, xdat = -, .dat/, .dat -> /said, .dat = secret, .dat|}
       | No ICU schema found for ~/tz/2026a
