@@ -27,7 +27,7 @@ struct fts_closer {
 using fts_handle = std::unique_ptr<FTS, fts_closer>;
 
 // On 32-bit machines glibc checks a directory that it changes to with a stat(2) of its own, whose
-// times have 32 bits: one from after 2038 could not be read. So it stays where it is there.
+// times have 32 bits: one from after 2038 could not be read. There FTS_NOCHDIR keeps it from that.
 constexpr int stay_on_32_bits = sizeof(long) < 8 ? FTS_NOCHDIR : 0;
 
 // The entries come in the directory's own order, the root followed if it is a link, others not.
@@ -54,8 +54,8 @@ std::string find_schema(const std::string& directory) {
   const std::wregex pattern = byte_regex(L"icutz([0-9]+[lbe])\\.dat");
   const fts_handle traversal = open_traversal(directory);
   std::string schema;
-  for (const FTSENT* entry = nullptr;
-       (entry = ::fts_read(traversal.get())) != nullptr && schema.empty();) {
+  while (const FTSENT* const entry = ::fts_read(traversal.get())) {
+    if (!schema.empty()) break;
     if (!may_be_data_file(*entry)) continue;
     const std::vector<std::string> name = full_match(entry->fts_name, pattern);
     if (!name.empty()) schema = name[1];

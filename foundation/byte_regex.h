@@ -1,4 +1,4 @@
-// Regular expressions over plain bytes.
+// Regular expressions that match bytes, whatever the locale.
 
 #ifndef KELVANE_FOUNDATION_BYTE_REGEX_H_
 #define KELVANE_FOUNDATION_BYTE_REGEX_H_
@@ -16,7 +16,7 @@ inline std::wregex byte_regex(const wchar_t* pattern) {
 #ifdef __GLIBCXX__
   // The default matcher recurses for each character, so that a long text overflows the stack; the
   // matcher that this flag selects does not.
-  return std::wregex(pattern, std::regex::ECMAScript | std::regex_constants::__polynomial);
+  return std::wregex(pattern, std::wregex::ECMAScript | std::regex_constants::__polynomial);
 #else
   return std::wregex(pattern);
 #endif
@@ -27,7 +27,8 @@ inline std::wregex byte_regex(const wchar_t* pattern) {
 //
 // Example: "icutz44l.dat" and L"icutz([0-9]+[lbe])\\.dat" give "icutz44l.dat" and "44l".
 inline std::vector<std::string> full_match(const std::string& text, const std::wregex& pattern) {
-  const std::wstring wide(text.begin(), text.end());
+  std::wstring wide;  // Not by way of char, which may be negative: that is no wide character.
+  for (const unsigned char byte : text) wide.push_back(byte);
   std::wsmatch groups;
   std::regex_match(wide, groups, pattern);
   std::vector<std::string> texts;
