@@ -43,7 +43,7 @@ inline const std::string usual = R"(
     /usr/share/zoneinfo.default/release = 2022a
     /usr/share/icu/icutzformat.txt = 44l and more
     /usr/share/icu/icutz9l.dat = does not count
-    ~/tz/2022b/icutz -> ../2023c.1.0/icutz
+    ~/tz/02022b/icutz -> ../2023c.1.0/icutz
     ~/tz/2022z/icutz/icutz044l.dat = data
     ~/tz/2026z/icutz/icutz044l.dat = data
     ~/tz/2023c.1.0/icutz/icutz44l.dat = data

@@ -24,8 +24,7 @@ devices left_by_power_cuts(const std::string& device) {
   return left;
 }
 
-// What a device holds after a run of which the calls from `first` to `last` fail. Where one alone
-// fails, something else is done instead.
+// What a device holds after a run of which the calls from `first` to `last` fail.
 std::string left_by_failing(int first, int last, int error, const std::string& device) {
   int call = -1;
   const auto fail = [&](const std::string&) {
@@ -100,11 +99,11 @@ void expect_repair(const devices& disturbed, const std::string& wanted) {
 
 TEST(a_disturbed_run, leaves_what_the_next_run_puts_right) {
   for (const std::string& links :
-       {std::string("no ~/zoneinfo\n"), links_to("2022b"), links_to("2022z"),
+       {std::string("no ~/zoneinfo\n"), links_to("02022b"), links_to("2022z"),
         links_to("2022z") + "no ~/tz_latest\n", links_to("2023c.1.0")}) {
     const std::string device = usual + "~/tz_latest -> ~/tz/2023c.1.0\n" + links + R"(
         ~/localtime -> /usr/share/zoneinfo/+VERSION
-        /var/db/icutz -> ~/tz/2022b/icutz
+        /var/db/icutz -> ~/tz/02022b/icutz
         /var/db/icu = file
     )";
     const std::string wanted = repaired(device);

@@ -22,14 +22,14 @@ TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
   //  +VERSION  zoneinfo   tz_latest  said              in use     record
   std::istringstream rows(R"(
       2023c     2023c.1.0  -          -                 2023c.1.0  -
-      2022b     2022b      -          rejected          system     -
+      2022b     02022b     -          rejected          system     -
       2022a     system     2023c.1.0  -                 2023c.1.0  2022a.1.0_2023c.1.0
-      2022a     2022b      2023c.1.0  -                 2023c.1.0  2022b_2023c.1.0
+      2022a     02022b     2023c.1.0  -                 2023c.1.0  02022b_2023c.1.0
       2022a     2023c.1.0  2023c.1.0  refused           2023c.1.0  -
       2022a     system     2022z      refused           system     -
       2024b     2023c.1.0  2023c.1.0  rejected,refused  system     -
-      2024b     2022b      2023c.1.0  rejected          2023c.1.0  2024b.1.0_2023c.1.0
-      2022a     2022z      2022b      rejected,refused  system     -
+      2024b     02022b     2023c.1.0  rejected          2023c.1.0  2024b.1.0_2023c.1.0
+      2022a     2022z      02022b     rejected,refused  system     -
       2022a     2022z      2026z      rejected,refused  system     -
       2022a     2022z      2023c.1.0  rejected          2023c.1.0  2022a.1.0_2023c.1.0
   )");
@@ -110,7 +110,7 @@ TEST(a_start, uses_no_data_that_is_missing_or_does_not_fit) {
       | Invalid current symlinks; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
 
-      ~/zoneinfo -> ~/tz/2022b/anything
+      ~/zoneinfo -> ~/tz/02022b/anything
       ~/tz_latest -> {tz/2023c.1.0, ~/tz/, ~/tzdata/2023c, /~/tz/2023c.1.0}
       | orv_dataset::create_components: bad path *
       | Unable to locate data; resetting to system partition
