@@ -1,12 +1,4 @@
-// A device in a throw-away root directory, told as text. What it has, one entry a line; "~" is
-// /var/db/timezone, and of directories only the empty ones are entries:
-//   ~/a/link -> its target
-//   ~/a/file = its content, which others may not read if it is "secret"
-//   ~/a/directory/
-//   ~/a/pipe|
-//   no ~/a/path
-// What a start says, after "| " and without the program's name and the error text; last its status
-// unless it is 0, as in "| status 1", which for a signal is 128 and its number.
+// A device in a throw-away root directory, told as text: CONTRIBUTING.md explains the notation.
 
 #ifndef KELVANE_TESTS_DEVICE_H_
 #define KELVANE_TESTS_DEVICE_H_
