@@ -28,7 +28,7 @@ inline std::wregex byte_regex(const wchar_t* pattern) {
 // Example: "icutz44l.dat" and L"icutz([0-9]+[lbe])\\.dat" give "icutz44l.dat" and "44l".
 inline std::vector<std::string> full_match(const std::string& text, const std::wregex& pattern) {
   std::wstring wide;  // Not by way of char, which may be negative: that is no wide character.
-  for (const unsigned char byte : text) wide.push_back(byte);
+  for (const char byte : text) wide.push_back(static_cast<unsigned char>(byte));
   std::wsmatch groups;
   std::regex_match(wide, groups, pattern);
   std::vector<std::string> texts;
