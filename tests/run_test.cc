@@ -147,7 +147,7 @@ TEST(a_start, uses_no_data_that_is_missing_does_not_fit_or_has_too_large_a_numbe
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
 
-      ~/tz_latest -> ~/tz/{a, 2016, 2016A, 2016a., 2016a.1.2.3, 2016a.-1, 2016a1, 2016a/, tzdata2016a}
+      ~/tz_latest -> ~/tz/{a, 2016, 2016A, 2016a., 2016a.1.2.3, 2016a.-1, 2016a/, tzdata2016a}
       | Cannot parse version string *, results.size() = 0
       | Cannot parse version string *
       | No ICU schema found for ~/tz/*
