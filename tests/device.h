@@ -25,6 +25,8 @@ struct throw_away_root : testing::Environment {
     ASSERT_TRUE(::chroot(KELVANE_ROOT) == 0 && ::chdir("/") == 0)
         << "be root, or start this by: unshare --map-root-user";
     ::umask(022);  // Data that others may not read do not count.
+    fs::create_directories("/locale/xx");
+    ::mkfifo("/locale/xx/LC_IDENTIFICATION", 0600);
   }
 };
 inline const auto* const root = testing::AddGlobalTestEnvironment(new throw_away_root);
@@ -41,7 +43,6 @@ inline const std::string usual = R"(
     ~/tz/2023c.1.0/icutz/icutz44l.dat = data
     ~/tz/2023c.1.0/icutz/icutzformat.txt = does not count
     ~/tz/2023c.1.0/zoneinfo/+VERSION = 2030a
-    ~/tz/2023c.1.0/zoneinfo/Europe/Paris = time zone
     ~/zoneinfo -> /usr/share/zoneinfo.default
     ~/localtime -> ~/zoneinfo/Europe/Paris
     ~/TZVersionDiffRecord = longer than what is written now
@@ -100,7 +101,9 @@ inline std::string listing() {
 inline std::string start(const std::function<void()>& prepare = [] {}) {
   if (::fork() == 0) {
     ::dup2(::open("/said", O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644), STDERR_FILENO);
-    ::alarm(60);  // Ends a run that hangs, with status 142.
+    ::alarm(20);  // Ends a run that hangs, with status 142.
+    ::setenv("LC_ALL", "xx", 1);
+    ::setenv("LOCPATH", "/locale", 1);  // Where the locale xx is a pipe: who asks for it hangs.
     prepare();
     ::execl("/sbin/emulator", "emulator", "/sbin/kelvane", nullptr);  // Of another machine.
     ::execl("/sbin/kelvane", "any-name", "--version", "-n", nullptr);

@@ -26,7 +26,6 @@ TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
       2022a     system     2023c.1.0  -                 2023c.1.0  2022a.1.0_2023c.1.0
       2022a     02022b     2023c.1.0  -                 2023c.1.0  02022b_2023c.1.0
       2022a     2023c.1.0  2023c.1.0  refused           2023c.1.0  -
-      2022a     system     2022z      refused           system     -
       2024b     2023c.1.0  2023c.1.0  rejected,refused  system     -
       2024b     02022b     2023c.1.0  rejected          2023c.1.0  2024b.1.0_2023c.1.0
       2022a     2022z      02022b     rejected,refused  system     -
