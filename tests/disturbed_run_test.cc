@@ -24,7 +24,7 @@ devices left_by_power_cuts(const std::string& device) {
   return left;
 }
 
-// What a device holds after a run of which the calls from `first` to `last` fail.
+// What a device holds after a run of which calls `first` to `last` fail; one alone is got over.
 std::string left_by_failing(int first, int last, int error, const std::string& device) {
   int call = -1;
   const auto fail = [&](const std::string&) {

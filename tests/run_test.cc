@@ -242,8 +242,9 @@ TEST(a_start, makes_the_local_time_link_lead_through_the_store) {
       | Correcting localtime link to ~/zoneinfo*
       + ~/localtime -> ~/zoneinfo*
 
-      /usr/share/zoneinfo.default/%n -> missing
-      ~/localtime -> /usr/share/zoneinfo{/%n, .default/+VERSION}
+      ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
+      ~/tz/2023c.1.0/zoneinfo/%n -> missing
+      ~/localtime -> /usr/share/zoneinfo{/%n, /release, .default/+VERSION}
       | Correcting localtime link to ~/zoneinfo*
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles

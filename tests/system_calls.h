@@ -1,6 +1,5 @@
-// The calls "remove", "symlink" and "unlink" of a run, seen before they happen. By --wrap the
-// linker gives the names with __real to those of the C library, so that only one source may include
-// this.
+// The calls "remove", "symlink" and "unlink" of a run, seen before they happen. Only one source may
+// include this, since it defines what the linker's --wrap calls.
 
 #ifndef KELVANE_TESTS_SYSTEM_CALLS_H_
 #define KELVANE_TESTS_SYSTEM_CALLS_H_
