@@ -85,11 +85,15 @@ bool icu_link_can_follow(const std::string& device) {
 
 // Expects that the next run puts each of these right, after which there is nothing to do.
 void expect_repair(const devices& disturbed, const std::string& wanted) {
+  devices sound;
   for (const std::string& left : disturbed) {
-    const std::string sound = repaired(left);
-    EXPECT_TRUE(is_sound_but_for_caveats(sound, wanted)) << left << "becomes\n" << sound;
-    EXPECT_TRUE(has_nothing_to_do([] { start(); }, sound)) << sound;
-    EXPECT_TRUE(icu_link_can_follow(sound)) << sound;
+    const std::string becomes = repaired(left);
+    EXPECT_TRUE(is_sound_but_for_caveats(becomes, wanted)) << left << "becomes\n" << becomes;
+    sound.insert(becomes);
+  }
+  for (const std::string& device : sound) {
+    EXPECT_TRUE(has_nothing_to_do([] { start(); }, device)) << device;
+    EXPECT_TRUE(icu_link_can_follow(device)) << device;
   }
 }
 
@@ -105,9 +109,10 @@ TEST(a_disturbed_run, leaves_what_the_next_run_puts_right) {
     const std::string wanted = repaired(device);
     devices disturbed = left_by_failing_calls(device);
     disturbed.merge(left_by_power_cuts(device));
+    devices twice;  // The run that puts it right can be cut short as well.
+    for (const std::string& left : disturbed) twice.merge(left_by_power_cuts(left));
+    disturbed.merge(twice);
     expect_repair(disturbed, wanted);
-    // The run that puts it right can be cut short as well.
-    for (const std::string& left : disturbed) expect_repair(left_by_power_cuts(left), wanted);
   }
 }
 
