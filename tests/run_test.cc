@@ -17,38 +17,40 @@ void expect(const std::string& device, const std::string& said, const std::strin
   EXPECT_EQ(told + listing(), wanted) << "on the device\n" << device;
 }
 
-// A row is a device: its system's release, what its links lead to, its newest download; then what
-// its start says of the latter two, what is in use afterwards, and the record that is written.
+// A row is a device: the version of its system's data, the data that its links lead to, and its
+// newest download. Then which of the last two the start complains of, what is in use afterwards,
+// and the new content of the record. 2022unfit and 2026unfit have another schema than the system.
 TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
-  //  system     links to   tz_latest  said              in use     record
+  //  system     links to   download   complains of  in use     record
   const std::string table = R"(
-    # The links lead to usable data. A download is "refused" if it is not newer than that.
-      2022a.1.0  system     2023c.1.0  -                 2023c.1.0  2022a.1.0_2023c.1.0
-      2022a.1.0  2022b      2023c.1.0  -                 2023c.1.0  2022b_2023c.1.0
-      2022a.1.0  2023c.1.0  2023c.1.0  refused           2023c.1.0  -
-    # They lead to data older than the system's: "rejected". A download newer than it is taken.
-      2022b.1.0  2022b      -          rejected          system     -
-      2024b.1.0  2022b      2023c.1.0  rejected          2023c.1.0  2024b.1.0_2023c.1.0
-      2024b.1.0  2023c.1.0  2023c.1.0  rejected,refused  system     -
-    # Releases called "unfit" have another schema than the system.
-      2022a.1.0  2022unfit  2023c.1.0  rejected          2023c.1.0  2022a.1.0_2023c.1.0
-      2022a.1.0  2022unfit  2026unfit  rejected,refused  system     -
+    # The links lead to usable data. A download is used only if it is newer, by number, than that.
+      2022a.1.0  system     2023c.1.0  nothing       2023c.1.0  2022a.1.0_2023c.1.0
+      999z.1.0   system     2023c.1.0  nothing       2023c.1.0  999z.1.0_2023c.1.0
+      2022a.1.0  2022b      2023c.1.0  nothing       2023c.1.0  2022b_2023c.1.0
+      2022a.1.0  2023c.1.0  2023c.1.0  download      2023c.1.0  kept
+    # The links lead to older data than the system's. A download is used if it is newer than theirs.
+      2022b.1.0  2022b      none       links         system     kept
+      2024b.1.0  2022b      2023c.1.0  links         2023c.1.0  2024b.1.0_2023c.1.0
+      2024b.1.0  2023c.1.0  2023c.1.0  both          system     kept
+    # Nothing of another schema is used.
+      2022a.1.0  2022unfit  2023c.1.0  links         2023c.1.0  2022a.1.0_2023c.1.0
+      2022a.1.0  2022unfit  2026unfit  both          system     kept
   )";
   std::istringstream rows(std::regex_replace(table, std::regex("#.*"), ""));
-  std::string system, current, latest, said, used, record;
-  while (rows >> system >> current >> latest >> said >> used >> record) {
+  std::string system, current, latest, complaint, used, record;
+  while (rows >> system >> current >> latest >> complaint >> used >> record) {
     std::string device = usual + links_to(current) + "/usr/share/zoneinfo.default/+VERSION = ";
     device += system.substr(0, system.find('.')) + "\n";
-    if (latest != "-") device += "~/tz_latest -> ~/tz/" + latest + "\n";
-    const std::string rejected = "| Symlink points at data incompatible with installed system\n";
+    if (latest != "none") device += "~/tz_latest -> ~/tz/" + latest + "\n";
     const std::string& measure = current == "system" ? system : current;
-    const std::string refused =
+    const std::string of_links = "| Symlink points at data incompatible with installed system\n";
+    const std::string of_download =
         "| New update not compatible or older version: " + latest + " vs. " + measure + "\n";
-    std::string messages;
-    if (said.starts_with("rejected")) messages += rejected;
-    if (said.ends_with("refused")) messages += refused;
-    const std::string written = record == "-" ? "" : "~/TZVersionDiffRecord = " + record;
-    expect(device, messages, links_to(used) + written);
+    std::string said;
+    if (complaint == "links" || complaint == "both") said += of_links;
+    if (complaint == "download" || complaint == "both") said += of_download;
+    const std::string written = record == "kept" ? "" : "~/TZVersionDiffRecord = " + record;
+    expect(device, said, links_to(used) + written);
   }
 }
 
@@ -74,9 +76,12 @@ void expect_stories(const std::string& stories) {
   }
 }
 
-TEST(a_start, resets_links_to_data_that_is_missing_or_cannot_be_named) {
+// The usual device uses the system's data, 2022a.1.0, and has no ICU link. It has downloads that
+// fit, 2022b and 2023c.1.0, but no tz_latest. A %n harms a program that takes it for a format.
+
+TEST(a_start, uses_only_data_with_a_fitting_version_and_schema) {
   expect_stories(R"(
-    # The first start of a device, with a download: it has neither a link nor a zone.
+    # The first start, with neither zoneinfo nor localtime, sets Los Angeles and uses the download.
       no ~/zoneinfo
       no ~/localtime
       ~/tz_latest -> ~/tz/2023c.1.0
@@ -87,32 +92,36 @@ TEST(a_start, resets_links_to_data_that_is_missing_or_cannot_be_named) {
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-    # The link names nothing below a directory in ~/tz. The ICU links go too, even one to itself.
+    # A zoneinfo not of the form ~/tz/VERSION/... is reset, and both ICU links are removed.
       ~/icutz -> ~/tz/2022b/icutz
-      /var/db/icutz -> /var/db/icutz
-      ~/zoneinfo -> {zoneinfo, ~/tz/2022b, ~/tz//zoneinfo, /usr/share/zoneinfo.default/, %n}
+      /var/db/icutz -> /missing
+      ~/zoneinfo -> {tz/2022b/zoneinfo, ~/tz/2022b, ~/tz//tz, /usr/share/zoneinfo.default/, %n}
       | Bad zoneinfo link *
       | Invalid current symlinks; resetting to system partition
       - ~/icutz
       - /var/db/icutz
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A file stands in the link's place.
-      ~/zoneinfo = file
+    # A file at zoneinfo is replaced by the link. A download that is missing is not used.
+      no ~/tz
+      ~/tz_latest -> ~/tz/2023c.1.0
+      ~/zoneinfo = a file
       | read_symlink: ~/zoneinfo
       | Invalid current symlinks; resetting to system partition
+      | No ICU schema found for ~/tz/2023c.1.0
+      | New update not compatible or older version: 2023c.1.0 vs. 2022a.1.0
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # The download is no directory below ~/tz/: even a usable data set is given up.
-      ~/zoneinfo -> ~/tz/2022b/anything
+    # A tz_latest not of the form ~/tz/VERSION makes the start reset even a usable zoneinfo.
+      ~/zoneinfo -> ~/tz/2022b/zoneinfo
       ~/tz_latest -> {tz/2023c.1.0, ~/tz/, ~/tzdata/2023c, /var//db/timezone/tz/2023c.1.0}
       | orv_dataset::create_components: bad path *
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A number is above 2147483647: by one, or so that it would wrap to 2016 or to 1.
+    # A zoneinfo is reset if a number is above 2147483647, also if it would wrap to 2016 or to 1.
       ~/zoneinfo -> ~/tz/{2147483648a, 18446744073709553632a, 2016b.2147483648, 2016b.2.4294967297}/
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A file stands in the store's place, where nothing can be read, removed or made.
-      ~ = file
+    # With a file in the store's place, nothing can be read or made: status 1.
+      ~ = a file
       | read_symlink: ~/tz_latest
       | Unable to locate data; resetting to system partition
       | remove: could not remove ~/zoneinfo
@@ -124,43 +133,34 @@ TEST(a_start, resets_links_to_data_that_is_missing_or_cannot_be_named) {
       | create_symlink: from ~/localtime to ~/zoneinfo/America/Los_Angeles
       | Could not reset localtime link
       | status 1
-  )");
-}
-
-TEST(a_start, takes_no_data_of_which_version_or_schema_are_unknown) {
-  expect_stories(R"(
-    # The data in use has a name that is no version, because of its doubled slash.
-      ~/zoneinfo -> ~/tz//2023c.1.0/zoneinfo
-      | Cannot parse version string /2023c.1.0, results.size() = 0
-      | Cannot parse version string /2023c.1.0
-      | Symlink points at data incompatible with installed system
-      + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # The download's name is no version.
+    # A download whose name is no version is not used.
       ~/tz_latest -> ~/tz/{a, 2016, 2016A, 2016a., 2016a.1.2.3, 2016a.-1, 2016a/, /2016a, tz2016a}
       | Cannot parse version string *, results.size() = 0
       | Cannot parse version string *
       | No ICU schema found for ~/tz/*
       | New update not compatible or older version: * vs. 2022a.1.0
-    # The system's release with .1.0 behind it is no version. It is read twice, as it is in use.
-      /usr/share/zoneinfo.default/+VERSION = {anything, 2022a.2.0}
+    # The system's data stays in use though with .1.0 added it has no version: said in pairs, twice.
+      /usr/share/zoneinfo.default/+VERSION = {, unknown, 2022a.2.0}
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
-    # The system partition has no schema, the download has one.
+    # A download that has a schema is not used if the system has none.
       no /usr/share/icu/icutzformat.txt
-      ~/tz_latest -> ~/tz/2023c.1.0
-      | New update not compatible or older version: 2023c.1.0 vs. 2022a.1.0
-    # The download's data has another name or place, is no file, or others may not read it.
+      ~/tz_latest -> ~/tz/2026a
+      ~/tz/2026a/icutz/icutz{44b, 007e, 9l}.dat = data
+      | New update not compatible or older version: 2026a vs. 2022a.1.0
+    # A download is not used if its data file has another name or place, is no file, or is secret.
       /usr/share/icu/icutzformat.txt = 4l
       ~/tz_latest -> ~/tz/2026a
       ~/tz/2026a/icutz/below/icutz4l.dat = data
       ~/tz/2026a/icutz/icutz4l{.dat2 = -, xdat = -, .dat/, .dat -> /said, .dat = secret, .dat|}
       | No ICU schema found for ~/tz/2026a
       | New update not compatible or older version: 2026a vs. 2022a.1.0
-    # Neither the system nor the download has a schema: they match. No pipe is waited for.
+    # A download without a schema is used if the system has none. No pipe is waited for.
       /usr/share/icu/icutzformat.txt|
       ~/TZVersionDiffRecord|
+      ~/tz|
       ~/tz_latest -> ~/tz/2026a
       | No ICU schema found for ~/tz/2026a
       + ~/icutz -> ~/tz/2026a/icutz
@@ -168,19 +168,18 @@ TEST(a_start, takes_no_data_of_which_version_or_schema_are_unknown) {
   )");
 }
 
-TEST(a_start, mends_the_icu_link_and_the_local_time_link) {
+TEST(a_start, repairs_the_icu_link_and_the_local_time_link) {
   expect_stories(R"(
-    # An activation replaces a file, and removes the older link though that leads nowhere.
+    # An activation replaces a file at icutz, and removes /var/db/icutz though that leads nowhere.
       /var/db/icutz -> /missing
-      ~/icutz = file
-      ~/TZVersionDiffRecord -> /var/record
+      ~/icutz = a file
       ~/tz_latest -> ~/tz/2023c.1.0
       - /var/db/icutz
-      + /var/record = 2022a.1.0_2023c.1.0
+      + ~/TZVersionDiffRecord = 2022a.1.0_2023c.1.0
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-    # A directory in the ICU link's place fails the activation, and keeps the older link as well.
-      /var/db/icutz -> /kept
+    # A directory at icutz stays and fails the activation, which is undone. /var/db/icutz stays too.
+      /var/db/icutz -> /var/db/icutz
       ~/icutz/
       ~/tz_latest -> ~/tz/2023c.1.0
       | remove: could not remove ~/icutz
@@ -189,52 +188,52 @@ TEST(a_start, mends_the_icu_link_and_the_local_time_link) {
       | Unable to locate data; resetting to system partition
       | remove: could not remove ~/icutz
       | unlink of ICU softlink failed
-    # The older layout's link leads to something, and is carried over before that is removed.
-      /var/db/icu = goes last
+    # The target of /var/db/icutz is carried over to icutz, and only then /var/db/icu removed.
+      /var/db/icu = a file
       /var/db/icutz -> icu
       - /var/db/icu
       - /var/db/icutz
       + ~/icutz -> icu
-    # The ICU link leads to something: what stands in the older one's place goes, unread.
+    # Where icutz leads to something it stays, and /var/db/icutz is removed, even a file.
       ~/icutz -> /usr
-      /var/db/icutz = never read
-      /var/db/{icu/, icu -> missing}
+      /var/db/icutz = a file
+      /var/db/icu/
       - /var/db/icu
       - /var/db/icutz
-    # The ICU link leads nowhere, but is in the way.
-      /var/db/icutz -> /usr
+    # Where icutz leads nowhere it stays too: /var/db/icutz cannot be carried over, and is removed.
       ~/icutz -> /missing
+      /var/db/icutz -> /usr
+      /var/db/icu -> /missing
       | create_symlink: from ~/icutz to /usr
       | Could not migrate /var/db/icutz to ~/icutz
+      - /var/db/icu
       - /var/db/icutz
-    # Directories stand in the places of the older layout.
-      /var/db/icu/full/
+    # A directory at /var/db/icutz stays, and so does one at /var/db/icu that is not empty.
+      /var/db/icu/below/
       /var/db/icutz/
       | read_symlink: /var/db/icutz
       | Could not migrate /var/db/icutz to ~/icutz
       | remove: could not remove /var/db/icutz
       | Could not remove /var/db/icutz
-    # The local-time link begins with the zoneinfo link's path. (Nobody waits for the pipe.)
-      ~/tz|
+    # A localtime that begins with ~/zoneinfo stays, without a word.
       ~/localtime -> {~/zoneinfo, ~/zoneinfoX/No/Zone}
-    # The local-time link begins otherwise, wherever it leads. (Downloads need not exist.)
-      no ~/tz
-      ~/localtime -> {~/zoneinf, zoneinfo/, /var//db/timezone/zoneinfo, ../../../usr/share/zoneinfo}
+    # A localtime that begins otherwise is reset to Los Angeles.
+      ~/localtime -> {~/zone, zoneinfo/, /var//db/timezone/zoneinfo, ../../../usr/share/zoneinfo}
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
-    # A file or a directory stands in the local-time link's place.
-      ~/{localtime = file, localtime/}
+    # A file or a directory at localtime is replaced by the link to Los Angeles.
+      ~/{localtime = a file, localtime/}
       | read_symlink: ~/localtime
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
-    # The local-time link names the system partition, and the data in use has the same zone.
-      ~/localtime -> /usr/share/zoneinfo{, /+VERSION}
+    # In a localtime to the system's data, /usr/share/zoneinfo becomes ~/zoneinfo.
+      ~/localtime -> /usr/share/zoneinfo{, /Europe/Paris}
       | Correcting localtime link to ~/zoneinfo*
       + ~/localtime -> ~/zoneinfo*
-    # The local-time link names a zone that the data in use lacks, or has as a link to nowhere.
+    # ... but is reset to Los Angeles if the data in use has no such zone, or as a link to nowhere.
       ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-      ~/tz/2023c.1.0/zoneinfo/%n -> missing
-      ~/localtime -> /usr/share/zoneinfo{/%n, /release, .default/+VERSION}
+      ~/tz/2023c.1.0/zoneinfo/%n -> /missing
+      ~/localtime -> /usr/share/zoneinfo{/%n, /Europe/Paris, .default/Europe/Paris}
       | Correcting localtime link to ~/zoneinfo*
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
