@@ -101,14 +101,11 @@ TEST(a_start, uses_only_data_with_a_fitting_version_and_schema) {
       - ~/icutz
       - /var/db/icutz
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A file at zoneinfo is replaced by the link. A download that is missing is not used.
+    # A file at zoneinfo is replaced by the link, even if there never was a download.
       no ~/tz
-      ~/tz_latest -> ~/tz/2023c.1.0
       ~/zoneinfo = a file
       | read_symlink: ~/zoneinfo
       | Invalid current symlinks; resetting to system partition
-      | No ICU schema found for ~/tz/2023c.1.0
-      | New update not compatible or older version: 2023c.1.0 vs. 2022a.1.0
       + ~/zoneinfo -> /usr/share/zoneinfo.default
     # A tz_latest not of the form ~/tz/VERSION makes the start reset even a usable zoneinfo.
       ~/zoneinfo -> ~/tz/2022b/zoneinfo
@@ -133,12 +130,17 @@ TEST(a_start, uses_only_data_with_a_fitting_version_and_schema) {
       | create_symlink: from ~/localtime to ~/zoneinfo/America/Los_Angeles
       | Could not reset localtime link
       | status 1
-    # A download whose name is no version is not used.
+    # Data whose name is no version is not used, neither zoneinfo's nor that of tz_latest.
+      ~/zoneinfo -> ~/tz/2023c.1.0//zoneinfo
       ~/tz_latest -> ~/tz/{a, 2016, 2016A, 2016a., 2016a.1.2.3, 2016a.-1, 2016a/, /2016a, tz2016a}
+      | Cannot parse version string 2023c.1.0/, results.size() = 0
+      | Cannot parse version string 2023c.1.0/
+      | Symlink points at data incompatible with installed system
       | Cannot parse version string *, results.size() = 0
       | Cannot parse version string *
       | No ICU schema found for ~/tz/*
-      | New update not compatible or older version: * vs. 2022a.1.0
+      | New update not compatible or older version: * vs. 2023c.1.0/
+      + ~/zoneinfo -> /usr/share/zoneinfo.default
     # The system's data stays in use though with .1.0 added it has no version: said in pairs, twice.
       /usr/share/zoneinfo.default/+VERSION = {, unknown, 2022a.2.0}
       | Cannot parse version string *.1.0, results.size() = 0
