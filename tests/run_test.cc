@@ -41,6 +41,7 @@ TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
   while (rows >> system >> current >> latest >> complaint >> used >> record) {
     std::string device = usual + links_to(current) + "/usr/share/zoneinfo.default/+VERSION = ";
     device += system.substr(0, system.find('.')) + "\n";
+    device += "~/TZVersionDiffRecord = longer than what is written now\n";
     if (latest != "none") device += "~/tz_latest -> ~/tz/" + latest + "\n";
     const std::string& measure = current == "system" ? system : current;
     const std::string of_links = "| Symlink points at data incompatible with installed system\n";
