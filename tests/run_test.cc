@@ -20,7 +20,7 @@ void expect(const std::string& device, const std::string& said, const std::strin
 // A row is a device: the version of its system's data, the data that its links lead to, and its
 // newest download. Then which of the last two the start complains of, what is in use afterwards,
 // and the new content of the record. 2022unfit and 2026unfit have another schema than the system.
-TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
+TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to) {
   //  system     links to   download   complains of  in use     record
   const std::string table = R"(
     # The links lead to usable data. A download is used only if it is newer, by number, than that.
@@ -28,7 +28,7 @@ TEST(a_start, selects_the_newest_data_set_that_the_system_can_use) {
       999z.1.0   system     2023c.1.0  nothing       2023c.1.0  999z.1.0_2023c.1.0
       2022a.1.0  2022b      2023c.1.0  nothing       2023c.1.0  2022b_2023c.1.0
       2022a.1.0  2023c.1.0  2023c.1.0  download      2023c.1.0  kept
-    # The links lead to older data than the system's. A download is used if it is newer than theirs.
+    # The links lead to older data than the system's. Even a download between the two is used.
       2022b.1.0  2022b      none       links         system     kept
       2024b.1.0  2022b      2023c.1.0  links         2023c.1.0  2024b.1.0_2023c.1.0
       2024b.1.0  2023c.1.0  2023c.1.0  both          system     kept
@@ -118,7 +118,7 @@ TEST(a_start, uses_only_data_with_a_fitting_version_and_schema) {
       ~/zoneinfo -> ~/tz/{2147483648a, 18446744073709553632a, 2016b.2147483648, 2016b.2.4294967297}/
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # With a file in the store's place, nothing can be read or made: status 1.
+    # With a file in the store's place nothing can be read or made, and the status is 1.
       ~ = a file
       | read_symlink: ~/tz_latest
       | Unable to locate data; resetting to system partition
@@ -131,7 +131,7 @@ TEST(a_start, uses_only_data_with_a_fitting_version_and_schema) {
       | create_symlink: from ~/localtime to ~/zoneinfo/America/Los_Angeles
       | Could not reset localtime link
       | status 1
-    # Data whose name is no version is not used, neither zoneinfo's nor that of tz_latest.
+    # Data whose name is no version is not used, be it that of zoneinfo or that of tz_latest.
       ~/zoneinfo -> ~/tz/2023c.1.0//zoneinfo
       ~/tz_latest -> ~/tz/{a, 2016, 2016A, 2016a., 2016a.1.2.3, 2016a.-1, 2016a/, /2016a, tz2016a}
       | Cannot parse version string 2023c.1.0/, results.size() = 0
@@ -142,8 +142,8 @@ TEST(a_start, uses_only_data_with_a_fitting_version_and_schema) {
       | No ICU schema found for ~/tz/*
       | New update not compatible or older version: * vs. 2023c.1.0/
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # The system's data stays in use though with .1.0 added it has no version: said in pairs, twice.
-      /usr/share/zoneinfo.default/+VERSION = {, unknown, 2022a.2.0}
+    # The system's data stays in use even if its version, with .1.0 added, does not parse.
+      /usr/share/zoneinfo.default/+VERSION = {unknown, 2022a.2.0, }
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
       | Cannot parse version string *.1.0, results.size() = 0
@@ -181,7 +181,7 @@ TEST(a_start, repairs_the_icu_link_and_the_local_time_link) {
       + ~/TZVersionDiffRecord = 2022a.1.0_2023c.1.0
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-    # A directory at icutz stays and fails the activation, which is undone. /var/db/icutz stays too.
+    # A directory at icutz fails the activation, which is undone. It and /var/db/icutz stay.
       /var/db/icutz -> /var/db/icutz
       ~/icutz/
       ~/tz_latest -> ~/tz/2023c.1.0
@@ -191,19 +191,19 @@ TEST(a_start, repairs_the_icu_link_and_the_local_time_link) {
       | Unable to locate data; resetting to system partition
       | remove: could not remove ~/icutz
       | unlink of ICU softlink failed
-    # The target of /var/db/icutz is carried over to icutz, and only then /var/db/icu removed.
+    # /var/db/icutz is carried over to icutz before /var/db/icu, to which it leads, is removed.
       /var/db/icu = a file
       /var/db/icutz -> icu
       - /var/db/icu
       - /var/db/icutz
       + ~/icutz -> icu
-    # Where icutz leads to something it stays, and /var/db/icutz is removed, even a file.
+    # If icutz leads to something it stays, and /var/db/icutz goes, here a file, as does /var/db/icu.
       ~/icutz -> /usr
       /var/db/icutz = a file
       /var/db/icu/
       - /var/db/icu
       - /var/db/icutz
-    # Where icutz leads nowhere it stays too: /var/db/icutz cannot be carried over, and is removed.
+    # If icutz leads nowhere it stays, and /var/db/icutz goes without being carried over.
       ~/icutz -> /missing
       /var/db/icutz -> /usr
       /var/db/icu -> /missing
@@ -211,7 +211,7 @@ TEST(a_start, repairs_the_icu_link_and_the_local_time_link) {
       | Could not migrate /var/db/icutz to ~/icutz
       - /var/db/icu
       - /var/db/icutz
-    # A directory at /var/db/icutz stays, and so does one at /var/db/icu that is not empty.
+    # A directory at /var/db/icutz stays. One at /var/db/icu that is not empty stays too, unsaid.
       /var/db/icu/below/
       /var/db/icutz/
       | read_symlink: /var/db/icutz
@@ -220,7 +220,7 @@ TEST(a_start, repairs_the_icu_link_and_the_local_time_link) {
       | Could not remove /var/db/icutz
     # A localtime that begins with ~/zoneinfo stays, without a word.
       ~/localtime -> {~/zoneinfo, ~/zoneinfoX/No/Zone}
-    # A localtime that begins otherwise is reset to Los Angeles.
+    # A localtime that begins with neither ~/zoneinfo nor /usr/share/zoneinfo becomes Los Angeles.
       ~/localtime -> {~/zone, zoneinfo/, /var//db/timezone/zoneinfo, ../../../usr/share/zoneinfo}
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
@@ -229,11 +229,11 @@ TEST(a_start, repairs_the_icu_link_and_the_local_time_link) {
       | read_symlink: ~/localtime
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
-    # In a localtime to the system's data, /usr/share/zoneinfo becomes ~/zoneinfo.
+    # A localtime to /usr/share/zoneinfo... is changed to ~/zoneinfo..., if that leads to something.
       ~/localtime -> /usr/share/zoneinfo{, /Europe/Paris}
       | Correcting localtime link to ~/zoneinfo*
       + ~/localtime -> ~/zoneinfo*
-    # ... but is reset to Los Angeles if the data in use has no such zone, or as a link to nowhere.
+    # A localtime to /usr/share/zoneinfo... becomes Los Angeles if ~/zoneinfo... leads to nothing.
       ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
       ~/tz/2023c.1.0/zoneinfo/%n -> /missing
       ~/localtime -> /usr/share/zoneinfo{/%n, /Europe/Paris, .default/Europe/Paris}
