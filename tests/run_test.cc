@@ -197,7 +197,7 @@ TEST(a_start, repairs_the_icu_link_and_the_local_time_link) {
       - /var/db/icu
       - /var/db/icutz
       + ~/icutz -> icu
-    # If icutz leads to something it stays. /var/db/icutz goes, even a file, and so does /var/db/icu.
+    # If icutz leads to something it stays. /var/db/icutz goes, even a file; so does /var/db/icu.
       ~/icutz -> /usr
       /var/db/icutz = a file
       /var/db/icu/
