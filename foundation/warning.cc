@@ -20,8 +20,9 @@ void warn(const char* format, ...) {
 }
 
 void prepare_warnings() {
-  // A log that has lost its reader is a failed write, not the end of the run.
+  // A log without a reader and a file at its size limit are failed writes, not ends of the run.
   std::signal(SIGPIPE, SIG_IGN);
+  std::signal(SIGXFSZ, SIG_IGN);
   // Fully buffered, because a line-buffered stream would cut a message at a newline in a path.
   static char buffer[BUFSIZ];
   std::setvbuf(stderr, buffer, _IOFBF, sizeof buffer);

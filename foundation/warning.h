@@ -23,7 +23,7 @@ namespace kelvane {
 [[gnu::format(printf, 1, 2)]] void warn(const char* format, ...);
 
 // Makes warn() keep its guarantees, however the process was started: called once, first of all. It
-// ignores SIGPIPE, buffers standard error fully and sets the program's short name.
+// ignores SIGPIPE and SIGXFSZ, buffers standard error fully and sets the program's short name.
 void prepare_warnings();
 
 }  // namespace kelvane
