@@ -29,7 +29,7 @@ TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to
       999z.1.0   system     2023c.1.0  nothing       2023c.1.0  999z.1.0_2023c.1.0
       2022a.1.0  2022b      2023c.1.0  nothing       2023c.1.0  2022b_2023c.1.0
       2022a.1.0  2023c.1.0  2023c.1.0  download      2023c.1.0  kept
-    # They lead to older data (2022b is older than 2022b.1.0). Even a download between is used.
+    # The links lead to older data, as 2022b is here. A download need only be newer than that.
       2022b.1.0  2022b      none       links         system     kept
       2024b.1.0  2022b      2023c.1.0  links         2023c.1.0  2024b.1.0_2023c.1.0
     # Nothing of another schema is used.
@@ -78,11 +78,10 @@ void expect_stories(const std::string& stories) {
 }
 
 // The usual device uses the system's data, 2022a.1.0, and has no ICU link. It has downloads that
-// fit, 2022b and 2023c.1.0, but no tz_latest. A %n harms a program that takes it for a format.
-
+// fit, 2022b and 2023c.1.0, but no tz_latest. What does not parse is told of in two lines.
 TEST(a_start, changes_what_its_story_says_and_nothing_else) {
   expect_stories(R"(
-    # The first start, in a store with a download alone, uses it and sets Los Angeles.
+    # A first start with a download: the missing links are reset, then the download is used.
       no ~
       ~/tz_latest -> ~/tz/2023c.1.0
       ~/tz/2023c.1.0/icutz/icutz44l.dat = data
@@ -110,7 +109,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       + ~/zoneinfo -> /usr/share/zoneinfo.default
     # An unfit zoneinfo is reset, then again for a tz_latest that is not of the form ~/tz/VERSION.
       ~/zoneinfo -> ~/tz/2022unfit/zoneinfo
-      ~/tz_latest -> {tz/2023c.1.0, ~/tz/, ~/tzdata/2023c, /var//db/timezone/tz/2023c.1.0}
+      ~/tz_latest -> {tz/2023c.1.0, ~/tz/, ~/tzdata/2023c, %n, /var//db/timezone/tz/2023c.1.0}
       | Symlink points at data incompatible with installed system
       | orv_dataset::create_components: bad path *
       | Unable to locate data; resetting to system partition
@@ -139,12 +138,12 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Symlink points at data incompatible with installed system
       + ~/zoneinfo -> /usr/share/zoneinfo.default
     # A download whose name is no version is not used.
-      ~/tz_latest -> ~/tz/{a, 2016, 2016A, 2016a., 2016a.1.2.3, 2016a-1, 2016a/, /2016a, tz2016a}
+      ~/tz_latest -> ~/tz/{a, 2016, 2016A, 2016a., 2016a.1.2.3, 2016a-1, 2016a/, /2016a, %n2016a}
       ~/tz/*/icutz/icutz44l.dat = data
       | Cannot parse version string *, results.size() = 0
       | Cannot parse version string *
       | New update not compatible or older version: * vs. 2022a.1.0
-    # The system's data stays in use even if its version, with .1.0 added, does not parse.
+    # A system version that with .1.0 added does not parse, even an empty one, stays in use.
       /usr/share/zoneinfo.default/+VERSION = {unknown, 2022a.2.0, }
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
@@ -171,12 +170,13 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | No ICU schema found for ~/tz/2026a
       + ~/icutz -> ~/tz/2026a/icutz
       + ~/zoneinfo -> ~/tz/2026a/zoneinfo
-    # An activation replaces a file at ~/icutz, and removes /var/db/icutz though it leads nowhere.
+    # An activation replaces a file at ~/icutz, and writes the record through a link.
       /var/db/icutz -> /missing
       ~/icutz = a file
+      ~/TZVersionDiffRecord -> /var/record
       ~/tz_latest -> ~/tz/2023c.1.0
       - /var/db/icutz
-      + ~/TZVersionDiffRecord = 2022a.1.0_2023c.1.0
+      + /var/record = 2022a.1.0_2023c.1.0
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
     # A directory at ~/icutz fails the activation: nothing changes. (/var/db/icutz leads to itself.)
@@ -189,25 +189,25 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Unable to locate data; resetting to system partition
       | remove: could not remove ~/icutz
       | unlink of ICU softlink failed
-    # /var/db/icutz is migrated to ~/icutz before /var/db/icu, to which it leads, is removed.
+    # /var/db/icutz is migrated to ~/icutz. Then /var/db/icu, to which it led, is removed.
       /var/db/icu = a file
       /var/db/icutz -> icu
       - /var/db/icu
       - /var/db/icutz
       + ~/icutz -> icu
-    # If ~/icutz leads to something it stays; /var/db/icutz, even a file, and /var/db/icu go.
+    # A ~/icutz that leads to something stays. /var/db/icutz, even a file, and /var/db/icu go.
       ~/icutz -> /usr
       /var/db/icutz = a file
       /var/db/icu/
       - /var/db/icu
       - /var/db/icutz
-    # If ~/icutz leads nowhere it stays: /var/db/icutz cannot be migrated, and goes.
+    # A ~/icutz that leads nowhere stays. /var/db/icutz cannot be migrated, and goes.
       ~/icutz -> /missing
       /var/db/icutz -> /usr
       | create_symlink: from ~/icutz to /usr
       | Could not migrate /var/db/icutz to ~/icutz
       - /var/db/icutz
-    # A directory at /var/db/icutz stays. So does one at /var/db/icu that is not empty, unsaid.
+    # A directory at /var/db/icutz stays. So does, without a word, a full one at /var/db/icu.
       /var/db/icu/below/
       /var/db/icutz/
       | read_symlink: /var/db/icutz
@@ -226,10 +226,10 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
     # A localtime to /usr/share/zoneinfo... is changed to ~/zoneinfo..., if that leads to something.
-      ~/localtime -> /usr/share/zoneinfo{, /Europe/Paris}
+      ~/localtime -> /usr/share/zoneinfo{/Europe/Paris, }
       | Correcting localtime link to ~/zoneinfo*
       + ~/localtime -> ~/zoneinfo*
-    # A localtime to /usr/share/zoneinfo... becomes Los Angeles if ~/zoneinfo... leads to nothing.
+    # A localtime to /usr/share/zoneinfo... becomes Los Angeles if ~/zoneinfo... is no such zone.
       ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
       ~/tz/2023c.1.0/zoneinfo/%n -> /missing
       ~/localtime -> /usr/share/zoneinfo{/%n, /Europe/Paris, .default/Europe/Paris}
