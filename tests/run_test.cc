@@ -24,15 +24,15 @@ void expect(const std::string& device, const std::string& said, const std::strin
 TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to) {
   //  system     links to   download   complains of  in use     record
   const std::string table = R"(
-    # The links lead to usable data. A download is used only if it is newer, by number, than that.
+    # Links to usable data. A download that is not newer, by number, is complained of.
       2022a.1.0  system     2023c.1.0  nothing       2023c.1.0  2022a.1.0_2023c.1.0
       999z.1.0   system     2023c.1.0  nothing       2023c.1.0  999z.1.0_2023c.1.0
       2022a.1.0  2022b      2023c.1.0  nothing       2023c.1.0  2022b_2023c.1.0
       2022a.1.0  2023c.1.0  2023c.1.0  download      2023c.1.0  kept
-    # The links lead to older data, as 2022b is here. A download need only be newer than that.
+    # Links to older data than the system's (2022b is older than 2022b.1.0) are complained of.
       2022b.1.0  2022b      none       links         system     kept
       2024b.1.0  2022b      2023c.1.0  links         2023c.1.0  2024b.1.0_2023c.1.0
-    # Nothing of another schema is used.
+    # So are links to data of another schema, and downloads with one.
       2022a.1.0  2022unfit  2023c.1.0  links         2023c.1.0  2022a.1.0_2023c.1.0
       2022a.1.0  2022unfit  2026unfit  both          system     kept
   )";
@@ -107,7 +107,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | read_symlink: ~/zoneinfo
       | Invalid current symlinks; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # An unfit zoneinfo is reset, then again for a tz_latest that is not of the form ~/tz/VERSION.
+    # An unfit zoneinfo is reset. A tz_latest not of the form ~/tz/VERSION is not used.
       ~/zoneinfo -> ~/tz/2022unfit/zoneinfo
       ~/tz_latest -> {tz/2023c.1.0, ~/tz/, ~/tzdata/2023c, %n, /var//db/timezone/tz/2023c.1.0}
       | Symlink points at data incompatible with installed system
@@ -143,7 +143,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Cannot parse version string *, results.size() = 0
       | Cannot parse version string *
       | New update not compatible or older version: * vs. 2022a.1.0
-    # A system version that with .1.0 added does not parse, even an empty one, stays in use.
+    # A system whose version (with .1.0 added) is no version stays in use. It is told of twice.
       /usr/share/zoneinfo.default/+VERSION = {unknown, 2022a.2.0, }
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
@@ -225,15 +225,15 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | read_symlink: ~/localtime
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
-    # A localtime to /usr/share/zoneinfo... is changed to ~/zoneinfo..., if that leads to something.
-      ~/localtime -> /usr/share/zoneinfo{/Europe/Paris, }
-      | Correcting localtime link to ~/zoneinfo*
-      + ~/localtime -> ~/zoneinfo*
-    # A localtime to /usr/share/zoneinfo... becomes Los Angeles if ~/zoneinfo... is no such zone.
+    # A localtime to /usr/share/zoneinfo... is changed to ~/zoneinfo..., which is there.
+      ~/localtime -> /usr/share/{zoneinfo/Europe/Paris, zoneinfo}
+      | Correcting localtime link to ~/*
+      + ~/localtime -> ~/*
+    # A localtime to /usr/share/zoneinfo... becomes Los Angeles: ~/zoneinfo... is not there.
       ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
       ~/tz/2023c.1.0/zoneinfo/%n -> /missing
-      ~/localtime -> /usr/share/zoneinfo{/%n, /Europe/Paris, .default/Europe/Paris}
-      | Correcting localtime link to ~/zoneinfo*
+      ~/localtime -> /usr/share/{zoneinfo/%n, zoneinfo/Europe/Paris, zoneinfo.default/Europe/Paris}
+      | Correcting localtime link to ~/*
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
   )");
