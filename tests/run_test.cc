@@ -92,7 +92,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-    # A zoneinfo to neither the system's data nor ~/tz/VERSION/... is reset; both ICU links go.
+    # A malformed zoneinfo is reset, and both ICU links are removed.
       ~/icutz -> ~/tz/2022b/icutz
       /var/db/icutz -> /missing
       ~/zoneinfo -> {tz/2022b/zoneinfo, ~/tz/2022b, ~/tz//tz, /usr/share/zoneinfo.default/, %n}
@@ -103,7 +103,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       + ~/zoneinfo -> /usr/share/zoneinfo.default
     # A file at zoneinfo is replaced by the link, even if there never was a download.
       no ~/tz
-      ~/zoneinfo = a file
+      ~/zoneinfo = data
       | read_symlink: ~/zoneinfo
       | Invalid current symlinks; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
@@ -119,7 +119,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
     # With a file in the store's place nothing can be read or made, and the status is 1.
-      ~ = a file
+      ~ = data
       | read_symlink: ~/tz_latest
       | Unable to locate data; resetting to system partition
       | remove: could not remove ~/zoneinfo
@@ -162,7 +162,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/tz/2026a/icutz/{icutz44l.dat/, icutz44l.dat = secret, icutz44l.dat -> /bin/sh}
       | No ICU schema found for ~/tz/2026a
       | New update not compatible or older version: 2026a vs. 2022a.1.0
-    # A download without a schema is used if the system has none. No pipe is waited for.
+    # No pipe is waited for. (A download without a schema is used as the system has none either.)
       /usr/share/icu/icutzformat.txt|
       ~/TZVersionDiffRecord|
       ~/tz|
@@ -172,7 +172,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       + ~/zoneinfo -> ~/tz/2026a/zoneinfo
     # An activation replaces a file at ~/icutz, and writes the record through a link.
       /var/db/icutz -> /missing
-      ~/icutz = a file
+      ~/icutz = data
       ~/TZVersionDiffRecord -> /var/record
       ~/tz_latest -> ~/tz/2023c.1.0
       - /var/db/icutz
@@ -190,14 +190,14 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | remove: could not remove ~/icutz
       | unlink of ICU softlink failed
     # /var/db/icutz is migrated to ~/icutz. Then /var/db/icu, to which it led, is removed.
-      /var/db/icu = a file
+      /var/db/icu = data
       /var/db/icutz -> icu
       - /var/db/icu
       - /var/db/icutz
       + ~/icutz -> icu
     # A ~/icutz that leads to something stays. /var/db/icutz, even a file, and /var/db/icu go.
       ~/icutz -> /usr
-      /var/db/icutz = a file
+      /var/db/icutz = data
       /var/db/icu/
       - /var/db/icu
       - /var/db/icutz
@@ -221,7 +221,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
     # A file or a directory at localtime is replaced by the link to Los Angeles.
-      ~/{localtime = a file, localtime/}
+      ~/{localtime = data, localtime/}
       | read_symlink: ~/localtime
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
@@ -229,10 +229,10 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/localtime -> /usr/share/{zoneinfo/Europe/Paris, zoneinfo}
       | Correcting localtime link to ~/*
       + ~/localtime -> ~/*
-    # A localtime to /usr/share/zoneinfo... becomes Los Angeles: ~/zoneinfo... is not there.
+    # A localtime to /usr/share/zoneinfo... becomes Los Angeles if ~/zoneinfo... is not there.
       ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-      ~/tz/2023c.1.0/zoneinfo/%n -> /missing
-      ~/localtime -> /usr/share/{zoneinfo/%n, zoneinfo/Europe/Paris, zoneinfo.default/Europe/Paris}
+      ~/tz/2023c.1.0/zoneinfo/Nowhere -> /missing
+      ~/localtime -> /usr/share/{zoneinfo/Nowhere, zoneinfo/Europe/Paris, zoneinfo.default/Nowhere}
       | Correcting localtime link to ~/*
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
