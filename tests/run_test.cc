@@ -231,8 +231,8 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       + ~/localtime -> ~/*
     # A localtime to /usr/share/zoneinfo... becomes Los Angeles if ~/zoneinfo... is not there.
       ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-      ~/tz/2023c.1.0/zoneinfo/Nowhere -> /missing
-      ~/localtime -> /usr/share/{zoneinfo/Nowhere, zoneinfo/Europe/Paris, zoneinfo.default/Europe/Paris}
+      ~/tz/2023c.1.0/zoneinfo/UTC -> /missing
+      ~/localtime -> /usr/share/{zoneinfo/UTC, zoneinfo/Europe/Paris, zoneinfo.default/Europe/Paris}
       | Correcting localtime link to ~/*
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
