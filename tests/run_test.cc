@@ -32,7 +32,7 @@ TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to
     # Links to older data than the system's (2022b is older than 2022b.1.0) are complained of.
       2022b.1.0  2022b      none       links         system     kept
       2024b.1.0  2022b      2023c.1.0  links         2023c.1.0  2024b.1.0_2023c.1.0
-    # So are links to data of another schema, and downloads with one.
+    # Links to data of another schema, and downloads with one, are complained of.
       2022a.1.0  2022unfit  2023c.1.0  links         2023c.1.0  2022a.1.0_2023c.1.0
       2022a.1.0  2022unfit  2026unfit  both          system     kept
   )";
@@ -41,7 +41,7 @@ TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to
   while (rows >> system >> current >> latest >> complaint >> used >> record) {
     std::string device = usual + links_to(current) + "/usr/share/zoneinfo.default/+VERSION = ";
     device += system.substr(0, system.find('.')) + "\n";
-    device += "~/TZVersionDiffRecord = longer than what is written now\n";
+    device += "~/TZVersionDiffRecord -> record\n ~/record = longer than what is written now\n";
     if (latest != "none") device += "~/tz_latest -> ~/tz/" + latest + "\n";
     const std::string& measure = current == "system" ? system : current;
     const std::string of_links = "| Symlink points at data incompatible with installed system\n";
@@ -50,7 +50,7 @@ TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to
     std::string said;
     if (complaint == "links" || complaint == "both") said += of_links;
     if (complaint == "download" || complaint == "both") said += of_download;
-    const std::string written = record == "kept" ? "" : "~/TZVersionDiffRecord = " + record;
+    const std::string written = record == "kept" ? "" : "~/record = " + record;
     expect(device, said, links_to(used) + written);
   }
 }
@@ -77,8 +77,8 @@ void expect_stories(const std::string& stories) {
   }
 }
 
-// The usual device uses the system's data, 2022a.1.0, and has no ICU link. It has downloads that
-// fit, 2022b and 2023c.1.0, but no tz_latest. What does not parse is told of in two lines.
+// The usual device uses the system's data, 2022a.1.0. It has no ICU link, no tz_latest, and two
+// downloads that fit, 2022b and 2023c.1.0. What does not parse makes two lines. %n is plain text.
 TEST(a_start, changes_what_its_story_says_and_nothing_else) {
   expect_stories(R"(
     # A first start with a download: the missing links are reset, then the download is used.
@@ -92,14 +92,12 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-    # A malformed zoneinfo is reset, and both ICU links are removed.
+    # A malformed zoneinfo is reset, and the ICU link is removed.
       ~/icutz -> ~/tz/2022b/icutz
-      /var/db/icutz -> /missing
       ~/zoneinfo -> {tz/2022b/zoneinfo, ~/tz/2022b, ~/tz//tz, /usr/share/zoneinfo.default/, %n}
       | Bad zoneinfo link *
       | Invalid current symlinks; resetting to system partition
       - ~/icutz
-      - /var/db/icutz
       + ~/zoneinfo -> /usr/share/zoneinfo.default
     # A file at zoneinfo is replaced by the link, even if there never was a download.
       no ~/tz
@@ -107,29 +105,25 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | read_symlink: ~/zoneinfo
       | Invalid current symlinks; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # An unfit zoneinfo is reset. A tz_latest not of the form ~/tz/VERSION is not used.
-      ~/zoneinfo -> ~/tz/2022unfit/zoneinfo
+    # If tz_latest is not spelled ~/tz/VERSION, even a fit zoneinfo is reset.
+      ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
       ~/tz_latest -> {tz/2023c.1.0, ~/tz/, ~/tzdata/2023c, %n, /var//db/timezone/tz/2023c.1.0}
-      | Symlink points at data incompatible with installed system
       | orv_dataset::create_components: bad path *
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A zoneinfo is reset if a number is above 2147483647, also if it would wrap to 2016 or to 1.
+    # A zoneinfo with a number above 2147483647 in its version is reset, even if it could wrap.
       ~/zoneinfo -> ~/tz/{2147483648a, 18446744073709553632a, 2016b.2147483648, 2016b.2.4294967297}/
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # With a file in the store's place nothing can be read or made, and the status is 1.
-      ~ = data
+    # A file at tz_latest has zoneinfo reset. A directory at zoneinfo stays, and the status is 1.
+      ~/tz_latest = data
+      ~/zoneinfo/
       | read_symlink: ~/tz_latest
       | Unable to locate data; resetting to system partition
       | remove: could not remove ~/zoneinfo
       | Unlink of zoneinfo softlink failed
       | create_symlink: from ~/zoneinfo to /usr/share/zoneinfo.default
       | Could not reset to system partition
-      | read_symlink: ~/localtime
-      | localtime link invalid; resetting to America/Los_Angeles
-      | create_symlink: from ~/localtime to ~/zoneinfo/America/Los_Angeles
-      | Could not reset localtime link
       | status 1
     # A zoneinfo to data whose name is no version, here for the doubled slash, is reset.
       ~/zoneinfo -> ~/tz/2023c.1.0//zoneinfo
@@ -143,14 +137,14 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Cannot parse version string *, results.size() = 0
       | Cannot parse version string *
       | New update not compatible or older version: * vs. 2022a.1.0
-    # A system whose version (with .1.0 added) is no version stays in use. It is told of twice.
+    # A system whose version, also an empty one, does not parse stays in use. It is told of twice.
       /usr/share/zoneinfo.default/+VERSION = {unknown, 2022a.2.0, }
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
-    # A download that has a schema is not used if the system has none.
-      no /usr/share/icu/icutzformat.txt
+    # A download that has a schema is not used if the system has none, here for a pipe.
+      /usr/share/icu/icutzformat.txt|
       ~/tz_latest -> ~/tz/2026a
       ~/tz/2026a/icutz/icutz{44b, 007e, 9l}.dat = data
       | New update not compatible or older version: 2026a vs. 2022a.1.0
@@ -162,25 +156,23 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/tz/2026a/icutz/{icutz44l.dat/, icutz44l.dat = secret, icutz44l.dat -> /bin/sh}
       | No ICU schema found for ~/tz/2026a
       | New update not compatible or older version: 2026a vs. 2022a.1.0
-    # No pipe is waited for. (A download without a schema is used as the system has none either.)
-      /usr/share/icu/icutzformat.txt|
-      ~/TZVersionDiffRecord|
-      ~/tz|
+    # A download without a schema is used if the system has none. A record that is no file stays.
+      no /usr/share/icu/icutzformat.txt
+      ~/TZVersionDiffRecord{|, /}
       ~/tz_latest -> ~/tz/2026a
       | No ICU schema found for ~/tz/2026a
       + ~/icutz -> ~/tz/2026a/icutz
       + ~/zoneinfo -> ~/tz/2026a/zoneinfo
-    # An activation replaces a file at ~/icutz, and writes the record through a link.
+    # An activation replaces a file at ~/icutz, and removes a dangling /var/db/icutz.
       /var/db/icutz -> /missing
       ~/icutz = data
-      ~/TZVersionDiffRecord -> /var/record
       ~/tz_latest -> ~/tz/2023c.1.0
       - /var/db/icutz
-      + /var/record = 2022a.1.0_2023c.1.0
+      + ~/TZVersionDiffRecord = 2022a.1.0_2023c.1.0
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-    # A directory at ~/icutz fails the activation: nothing changes, nor is /var/db/icutz removed.
-      /var/db/icutz -> /bin/sh/missing
+    # With a directory at ~/icutz no download is used. A dangling /var/db/icutz stays as well.
+      /var/db/icutz -> /missing
       ~/icutz/
       ~/tz_latest -> ~/tz/2023c.1.0
       | remove: could not remove ~/icutz
@@ -225,14 +217,21 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | read_symlink: ~/localtime
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
+    # A full directory at localtime stays, and the status is 1.
+      no ~/localtime
+      ~/localtime/below/
+      | read_symlink: ~/localtime
+      | localtime link invalid; resetting to America/Los_Angeles
+      | create_symlink: from ~/localtime to ~/zoneinfo/America/Los_Angeles
+      | Could not reset localtime link
+      | status 1
     # A localtime to /usr/share/zoneinfo... is changed to ~/zoneinfo..., which is there.
       ~/localtime -> /usr/share/{zoneinfo/Europe/Paris, zoneinfo}
       | Correcting localtime link to ~/*
       + ~/localtime -> ~/*
     # A localtime to /usr/share/zoneinfo... becomes Los Angeles if ~/zoneinfo... is not there.
-      ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-      ~/tz/2023c.1.0/zoneinfo/UTC -> /missing
-      ~/localtime -> /usr/share/{zoneinfo/UTC, zoneinfo/Europe/Paris, zoneinfo.default/Europe/Paris}
+      /usr/share/zoneinfo.default/UTC -> /missing
+      ~/localtime -> /usr/share/{zoneinfo/No/Zone, zoneinfo/UTC, zoneinfo.default/Europe/Paris}
       | Correcting localtime link to ~/*
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
