@@ -45,6 +45,7 @@ inline const std::string usual = R"(
     ~/tz/2023c.1.0/zoneinfo/+VERSION = 2030a
     ~/zoneinfo -> /usr/share/zoneinfo.default
     ~/localtime -> ~/zoneinfo/Europe/Paris
+    ~/TZVersionDiffRecord = longer than what is written now
 )";
 
 // The entries by which a release, or the "system" partition, is in use.

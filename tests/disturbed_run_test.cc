@@ -120,7 +120,6 @@ TEST(a_disturbed_run, says_that_a_link_stays_even_if_it_is_right) {
   build(usual + "~/tz_latest -> /opt\n no ~/localtime");
   const auto fail = [](const std::string& call) { return call == "unlink" ? EROFS : 0; };
   const std::string told = start([&] { run_watched(fail); });
-  EXPECT_NE(told.find("| Could not reset to system partition\n"), told.npos) << told;
   EXPECT_TRUE(told.ends_with("resetting to America/Los_Angeles\n| status 1\n")) << told;
 }
 

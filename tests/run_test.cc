@@ -18,9 +18,8 @@ void expect(const std::string& device, const std::string& said, const std::strin
   EXPECT_EQ(told + listing(), wanted) << "on the device\n" << device;
 }
 
-// A row is a device: the version of its system's data, the data that its links lead to, and its
-// newest download. Then which of the last two the start complains of, what is in use afterwards,
-// and what the record says, or that it is kept. What is called "unfit" has another schema.
+// A row is a device: its system's version, what its links lead to, its newest download. Then which
+// of these two is complained of, what is in use, the record. What is "unfit" has another schema.
 TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to) {
   //  system     links to   download   complains of  in use     record
   const std::string table = R"(
@@ -41,16 +40,14 @@ TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to
   while (rows >> system >> current >> latest >> complaint >> used >> record) {
     std::string device = usual + links_to(current) + "/usr/share/zoneinfo.default/+VERSION = ";
     device += system.substr(0, system.find('.')) + "\n";
-    device += "~/TZVersionDiffRecord -> record\n ~/record = longer than what is written now\n";
     if (latest != "none") device += "~/tz_latest -> ~/tz/" + latest + "\n";
-    const std::string& measure = current == "system" ? system : current;
     const std::string of_links = "| Symlink points at data incompatible with installed system\n";
     const std::string of_download =
-        "| New update not compatible or older version: " + latest + " vs. " + measure + "\n";
+        "| New update not compatible or older version: " + latest + " vs. " + current + "\n";
     std::string said;
     if (complaint == "links" || complaint == "both") said += of_links;
     if (complaint == "download" || complaint == "both") said += of_download;
-    const std::string written = record == "kept" ? "" : "~/record = " + record;
+    const std::string written = record == "kept" ? "" : "~/TZVersionDiffRecord = " + record;
     expect(device, said, links_to(used) + written);
   }
 }
@@ -81,16 +78,13 @@ void expect_stories(const std::string& stories) {
 // downloads that fit, 2022b and 2023c.1.0. What does not parse makes two lines. %n is plain text.
 TEST(a_start, changes_what_its_story_says_and_nothing_else) {
   expect_stories(R"(
-    # A first start with a download: the missing links are reset, then the download is used.
+    # A missing zoneinfo is reset, then a download is used.
       no ~/zoneinfo
-      no ~/localtime
       ~/tz_latest -> ~/tz/2023c.1.0
       | Bad zoneinfo link
       | Invalid current symlinks; resetting to system partition
-      | localtime link invalid; resetting to America/Los_Angeles
       + ~/TZVersionDiffRecord = 2022a.1.0_2023c.1.0
       + ~/icutz -> ~/tz/2023c.1.0/icutz
-      + ~/localtime -> ~/zoneinfo/America/Los_Angeles
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
     # A malformed zoneinfo is reset, and the ICU link is removed.
       ~/icutz -> ~/tz/2022b/icutz
@@ -99,13 +93,12 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Invalid current symlinks; resetting to system partition
       - ~/icutz
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A file at zoneinfo is replaced by the link, even if there never was a download.
-      no ~/tz
+    # A file at zoneinfo is replaced by the link.
       ~/zoneinfo = data
       | read_symlink: ~/zoneinfo
       | Invalid current symlinks; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # If tz_latest is not spelled ~/tz/VERSION, even a fit zoneinfo is reset.
+    # If tz_latest is not spelled ~/tz/VERSION, even a zoneinfo to usable data is reset.
       ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
       ~/tz_latest -> {tz/2023c.1.0, ~/tz/, ~/tzdata/2023c, %n, /var//db/timezone/tz/2023c.1.0}
       | orv_dataset::create_components: bad path *
@@ -115,7 +108,8 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/zoneinfo -> ~/tz/{2147483648a, 18446744073709553632a, 2016b.2147483648, 2016b.2.4294967297}/
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A file at tz_latest has zoneinfo reset. A directory at zoneinfo stays, and the status is 1.
+    # A directory at zoneinfo cannot be reset: it stays, as does the ICU link, and the status is 1.
+      ~/icutz -> ~/tz/2023c.1.0/icutz
       ~/tz_latest = data
       ~/zoneinfo/
       | read_symlink: ~/tz_latest
@@ -132,28 +126,30 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Symlink points at data incompatible with installed system
       + ~/zoneinfo -> /usr/share/zoneinfo.default
     # A download whose name is no version is not used.
-      ~/tz_latest -> ~/tz/{a, 2016, 2016A, 2016a., 2016a.1.2.3, 2016a-1, 2016a/, /2016a, %n2016a}
+      ~/tz_latest -> ~/tz/{a, 2026, 2026A, 2026a., 2026a.1.2.3, 2026a-1, 2026a/, /2026a, %n2026a}
       ~/tz/*/icutz/icutz44l.dat = data
       | Cannot parse version string *, results.size() = 0
       | Cannot parse version string *
       | New update not compatible or older version: * vs. 2022a.1.0
-    # A system whose version, also an empty one, does not parse stays in use. It is told of twice.
+    # A system version that is empty or does not parse is told of twice. It stays in use.
       /usr/share/zoneinfo.default/+VERSION = {unknown, 2022a.2.0, }
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
-    # A download that has a schema is not used if the system has none, here for a pipe.
+    # A download that has a schema is not used if the system has none, as its file is a pipe.
       /usr/share/icu/icutzformat.txt|
       ~/tz_latest -> ~/tz/2026a
-      ~/tz/2026a/icutz/icutz{44b, 007e, 9l}.dat = data
+      ~/tz/2026a/icutz/icutz{44b, 44e, 9l}.dat = data
       | New update not compatible or older version: 2026a vs. 2022a.1.0
-    # A download is not used if its data file has another name or place, is no file, or is secret.
+    # A download is not used if its data file has another name or place.
       ~/tz_latest -> ~/tz/2026a
-      ~/tz/2026a/icutz/xicutz44l.dat2 = data
-      ~/tz/2026a/icutz/icutz44l-dat = data
-      ~/tz/2026a/icutz/below/icutz44l.dat = data
-      ~/tz/2026a/icutz/{icutz44l.dat/, icutz44l.dat = secret, icutz44l.dat -> /bin/sh}
+      ~/tz/2026a/icutz/{xicutz44l.dat, icutz44l.dat2, icutz44l-dat, below/icutz44l.dat} = data
+      | No ICU schema found for ~/tz/2026a
+      | New update not compatible or older version: 2026a vs. 2022a.1.0
+    # A download is not used if its data file is a directory, a link, or secret.
+      ~/tz_latest -> ~/tz/2026a
+      ~/tz/2026a/icutz/{icutz44l.dat/, icutz44l.dat -> /bin/sh, icutz44l.dat = secret}
       | No ICU schema found for ~/tz/2026a
       | New update not compatible or older version: 2026a vs. 2022a.1.0
     # A download without a schema is used if the system has none. A record that is no file stays.
@@ -171,8 +167,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       + ~/TZVersionDiffRecord = 2022a.1.0_2023c.1.0
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-    # With a directory at ~/icutz no download is used. A dangling /var/db/icutz stays as well.
-      /var/db/icutz -> /missing
+    # With a directory at ~/icutz an activation fails, and a reset undoes it.
       ~/icutz/
       ~/tz_latest -> ~/tz/2023c.1.0
       | remove: could not remove ~/icutz
@@ -181,7 +176,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Unable to locate data; resetting to system partition
       | remove: could not remove ~/icutz
       | unlink of ICU softlink failed
-    # /var/db/icutz is migrated to ~/icutz. Then /var/db/icu, to which it led, is removed.
+    # /var/db/icutz moves to ~/icutz as it is. Then /var/db/icu, to which it led, is removed.
       /var/db/icu = data
       /var/db/icutz -> icu
       - /var/db/icu
@@ -190,10 +185,10 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
     # A ~/icutz that leads to something stays. /var/db/icutz, even a file, and /var/db/icu go.
       ~/icutz -> /usr
       /var/db/icutz = data
-      /var/db/icu/
+      /var/db/{icu/, icu -> /missing}
       - /var/db/icu
       - /var/db/icutz
-    # A ~/icutz that leads nowhere stays. /var/db/icutz cannot be migrated, and goes.
+    # /var/db/icutz cannot move to a ~/icutz that is taken, here by a link to nowhere. It goes.
       ~/icutz -> /missing
       /var/db/icutz -> /usr
       | create_symlink: from ~/icutz to /usr
@@ -206,6 +201,11 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Could not migrate /var/db/icutz to ~/icutz
       | remove: could not remove /var/db/icutz
       | Could not remove /var/db/icutz
+    # A missing localtime becomes Los Angeles, even if there never was a download.
+      no ~/localtime
+      no ~/tz
+      | localtime link invalid; resetting to America/Los_Angeles
+      + ~/localtime -> ~/zoneinfo/America/Los_Angeles
     # A localtime that begins with ~/zoneinfo stays, without a word.
       ~/localtime -> {~/zoneinfo, ~/zoneinfoX/No/Zone}
     # A localtime that begins with neither ~/zoneinfo nor /usr/share/zoneinfo becomes Los Angeles.
@@ -225,13 +225,13 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | create_symlink: from ~/localtime to ~/zoneinfo/America/Los_Angeles
       | Could not reset localtime link
       | status 1
-    # A localtime to /usr/share/zoneinfo... is changed to ~/zoneinfo..., which is there.
+    # A localtime to /usr/share/zoneinfo... is changed to ~/zoneinfo... if that is there.
       ~/localtime -> /usr/share/{zoneinfo/Europe/Paris, zoneinfo}
       | Correcting localtime link to ~/*
       + ~/localtime -> ~/*
-    # A localtime to /usr/share/zoneinfo... becomes Los Angeles if ~/zoneinfo... is not there.
+    # A localtime to /usr/share/zoneinfo... becomes Los Angeles if that is not there.
       /usr/share/zoneinfo.default/UTC -> /missing
-      ~/localtime -> /usr/share/{zoneinfo/No/Zone, zoneinfo/UTC, zoneinfo.default/Europe/Paris}
+      ~/localtime -> /usr/share/{zoneinfo/UTC, zoneinfo/Europe/Paris/No, zoneinfoX/Europe/Paris}
       | Correcting localtime link to ~/*
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
