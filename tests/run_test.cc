@@ -28,7 +28,7 @@ TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to
       999z.1.0   system     2023c.1.0  nothing       2023c.1.0  999z.1.0_2023c.1.0
       2022a.1.0  2022b      2023c.1.0  nothing       2023c.1.0  2022b_2023c.1.0
       2022a.1.0  2023c.1.0  2023c.1.0  download      2023c.1.0  kept
-    # Links to older data than the system's (2022b is below 2022b.1.0) are complained of and reset.
+    # Links to older data than the system's are complained of; a download newer than it is used.
       2022b.1.0  2022b      none       links         system     kept
       2024b.1.0  2022b      2023c.1.0  links         2023c.1.0  2024b.1.0_2023c.1.0
     # Links to data of another schema, and a download with one, are complained of.
@@ -130,7 +130,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Cannot parse version string *, results.size() = 0
       | Cannot parse version string *
       | New update not compatible or older version: * vs. 2022a.1.0
-    # A system version that is empty or does not parse is told of twice. It stays in use.
+    # A system version that is empty or does not parse is told of twice. The data stays in use.
       /usr/share/zoneinfo.default/+VERSION = {unknown, 2022a.2.0, }
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
@@ -176,7 +176,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Unable to locate data; resetting to system partition
       | remove: could not remove ~/icutz
       | unlink of ICU softlink failed
-    # /var/db/icutz moves to ~/icutz as it is. Then /var/db/icu, to which it led, is removed.
+    # /var/db/icutz moves to ~/icutz, its text unchanged. Then /var/db/icu, to which it led, is removed.
       /var/db/icu = data
       /var/db/icutz -> icu
       - /var/db/icu
@@ -188,7 +188,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       /var/db/{icu/, icu -> /missing}
       - /var/db/icu
       - /var/db/icutz
-    # /var/db/icutz cannot move to a ~/icutz that is taken, here by a link to nowhere. It goes.
+    # /var/db/icutz goes even if it cannot move, as ~/icutz is taken by a link to nowhere.
       ~/icutz -> /missing
       /var/db/icutz -> /usr
       | create_symlink: from ~/icutz to /usr
@@ -229,7 +229,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/localtime -> /usr/share/{zoneinfo/Europe/Paris, zoneinfo}
       | Correcting localtime link to ~/*
       + ~/localtime -> ~/*
-    # A localtime that begins with /usr/share/zoneinfo becomes Los Angeles if ~ lacks the place.
+    # A localtime into /usr/share/zoneinfo becomes Los Angeles if the same under ~ leads to nothing.
       /usr/share/zoneinfo.default/UTC -> /missing
       ~/localtime -> /usr/share/{zoneinfo/UTC, zoneinfo/+VERSION/a, zoneinfo.default/Europe/Paris}
       | Correcting localtime link to ~/*
