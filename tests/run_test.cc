@@ -28,7 +28,7 @@ TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to
       999z.1.0   system     2023c.1.0  nothing       2023c.1.0  999z.1.0_2023c.1.0
       2022a.1.0  2022b      2023c.1.0  nothing       2023c.1.0  2022b_2023c.1.0
       2022a.1.0  2023c.1.0  2023c.1.0  download      2023c.1.0  kept
-    # Links to older data than the system's are complained of; a download newer than it is used.
+    # Links to older data than the system's are complained of; a download newer than those is used.
       2022b.1.0  2022b      none       links         system     kept
       2024b.1.0  2022b      2023c.1.0  links         2023c.1.0  2024b.1.0_2023c.1.0
     # Links to data of another schema, and a download with one, are complained of.
@@ -229,7 +229,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/localtime -> /usr/share/{zoneinfo/Europe/../Europe/Paris, zoneinfo}
       | Correcting localtime link to ~/*
       + ~/localtime -> ~/*
-    # A localtime into /usr/share/zoneinfo becomes Los Angeles if the same under ~ leads to nothing.
+    # A localtime that begins with /usr/share/zoneinfo becomes Los Angeles if ~ lacks the place.
       /usr/share/zoneinfo.default/UTC -> /missing
       ~/localtime -> /usr/share/{zoneinfo/UTC, zoneinfo/+VERSION/a, zoneinfo.default/Europe/Paris}
       | Correcting localtime link to ~/*
