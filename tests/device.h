@@ -33,7 +33,8 @@ inline const auto* const root = testing::AddGlobalTestEnvironment(new throw_away
 
 // What each device has unless it says otherwise: links with which nothing is wrong, and data.
 inline const std::string usual = R"(
-    /usr/share/zoneinfo.default/+VERSION = 2022a
+    /usr/share/version = 2022a
+    /usr/share/zoneinfo.default/+VERSION -> ../version
     /usr/share/zoneinfo.default/Europe/Paris = data
     /usr/share/icu/icutzformat.txt = 44l and more
     /usr/share/icu/icutz9l.dat = does not count
