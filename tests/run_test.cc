@@ -27,8 +27,9 @@ TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to
       2022a.1.0  2022b      2023c.1.0  nothing       2023c.1.0  2022b_2023c.1.0
       999z.1.0   system     2023c.1.0  nothing       2023c.1.0  999z.1.0_2023c.1.0
       2022a.1.0  2023c.1.0  2023c.1.0  download      2023c.1.0  kept
-    # Complained of: links to older data than the system's. Any download newer than those is used.
+    # Links to older data than the system's are complained of; 2022b is older than 2022b.1.0.
       2022b.1.0  2022b      none       links         system     kept
+    # Then a download newer than those links is used, even if it is older than the system's data.
       2024b.1.0  2022b      2023c.1.0  links         2023c.1.0  2024b.1.0_2023c.1.0
     # Links to data of another schema, and a download with one, are complained of.
       2022a.1.0  2022unfit  2026unfit  both          system     kept
@@ -72,8 +73,8 @@ void expect_stories(const std::string& stories) {
   }
 }
 
-// The usual device uses the system's data, 2022a.1.0. It has no ICU link, no tz_latest, and two
-// downloads that fit, 2022b and 2023c.1.0. What does not parse makes two lines. %n is plain text.
+// The usual device uses the system's data, 2022a.1.0; its downloads 2022b and 2023c.1.0 fit. It has
+// no tz_latest, and no ~/icutz: one that is there changes only with zoneinfo. %n is plain text.
 TEST(a_start, changes_what_its_story_says_and_nothing_else) {
   expect_stories(R"(
     # A missing zoneinfo is reset, then a download is used.
@@ -102,33 +103,32 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | orv_dataset::create_components: bad path *
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A number above 2147483647 cannot be held: a zoneinfo to such a version is reset.
+    # A zoneinfo to data whose version has a number above 2147483647 is reset.
       ~/zoneinfo -> ~/tz/{2147483648a, 2022b.2147483648, 2022b.1.18446744073709551617}/zoneinfo
+      ~/tz/*/icutz/icutz44l.dat = data
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A file at tz_latest makes even a zoneinfo to usable data be reset.
+    # With a file at tz_latest no data can be located.
       ~/tz_latest = data
-      ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
       | read_symlink: ~/tz_latest
       | Unable to locate data; resetting to system partition
-      + ~/zoneinfo -> /usr/share/zoneinfo.default
     # A zoneinfo to a release whose name does not parse, as 2023c.1.0/, is reset.
       ~/zoneinfo -> ~/tz/2023c.1.0//
       | Cannot parse version string 2023c.1.0/, results.size() = 0
       | Cannot parse version string 2023c.1.0/
       | Symlink points at data incompatible with installed system
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A download whose name is no version is not used.
-      ~/tz_latest -> ~/tz/{a, 2026, 2026A, 2026a., 2026a.1.2.3, 2026a/, /2026a, %n2026a}
+    # A download whose name is no version is not used, though its data fit.
+      ~/tz_latest -> ~/tz/{2026, 2026A, 2026a., 2026a.1.2.3, 2026a/, %n2026a}
       ~/tz/*/icutz/icutz44l.dat = data
       | Cannot parse version string *, results.size() = 0
       | Cannot parse version string *
       | New update not compatible or older version: * vs. 2022a.1.0
     # A system version that does not parse is older than all: a download in use stays.
-      /usr/share/zoneinfo.default/+VERSION = {unknown, 2022a.2.0}
+      /usr/share/version = unknown
       ~/zoneinfo -> ~/tz/2022b/zoneinfo
-      | Cannot parse version string *.1.0, results.size() = 0
-      | Cannot parse version string *.1.0
+      | Cannot parse version string unknown.1.0, results.size() = 0
+      | Cannot parse version string unknown.1.0
     # A download with a schema is not used if the system has none.
       no /usr/share/icu/icutzformat.txt
       ~/tz_latest -> ~/tz/2026a
@@ -159,7 +159,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       + ~/TZVersionDiffRecord = 2022a.1.0_2023c.1.0
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-    # A directory at ~/icutz stays, and makes an activation be undone.
+    # Past a directory at ~/icutz no download can be activated, and nothing changes.
       ~/icutz/
       ~/tz_latest -> ~/tz/2023c.1.0
       | remove: could not remove ~/icutz
@@ -169,18 +169,18 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | remove: could not remove ~/icutz
       | unlink of ICU softlink failed
     # /var/db/icutz moves to ~/icutz, its text kept. Then /var/db/icu, to which it led, is removed.
-      /var/db/icu = data
+      /var/db/icu/
       /var/db/icutz -> icu
       - /var/db/icu
       - /var/db/icutz
       + ~/icutz -> icu
-    # If ~/icutz leads to something, a file at /var/db/icutz goes. So does what is at /var/db/icu.
+    # If ~/icutz leads to something, a file at /var/db/icutz goes. A link at /var/db/icu goes.
       ~/icutz -> /usr
       /var/db/icutz = data
-      /var/db/{icu/, icu -> /missing}
+      /var/db/icu -> /missing
       - /var/db/icu
       - /var/db/icutz
-    # /var/db/icutz goes even if it cannot move, as ~/icutz is taken by a link to nowhere.
+    # /var/db/icutz goes even if it cannot move, as a dangling ~/icutz is in the way.
       ~/icutz -> /missing
       /var/db/icutz -> /usr
       | create_symlink: from ~/icutz to /usr
@@ -208,11 +208,11 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | read_symlink: ~/localtime
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
-    # A localtime that begins with /usr/share/zoneinfo is led to the same place under ~.
+    # A localtime that begins with /usr/share/zoneinfo then leads to ~/zoneinfo, the rest being kept.
       ~/localtime -> /usr/share/{zoneinfo/Europe/../Europe/Paris, zoneinfo}
       | Correcting localtime link to ~/*
       + ~/localtime -> ~/*
-    # A localtime that begins with /usr/share/zoneinfo becomes Los Angeles if ~ lacks the place.
+    # If there is nothing under ~ (which has no zoneinfo.default), localtime becomes Los Angeles.
       /usr/share/zoneinfo.default/UTC -> /missing
       ~/localtime -> /usr/share/{zoneinfo/UTC, zoneinfo/+VERSION/a, zoneinfo.default/Europe/Paris}
       | Correcting localtime link to ~/*
