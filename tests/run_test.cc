@@ -23,7 +23,7 @@ void expect(const std::string& device, const std::string& said, const std::strin
 TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to) {
   //  system     links to   download   complains of  in use     record
   const std::string table = R"(
-    # Links to usable data. A newer download (2023 is above 999) is used, any other complained of.
+    # Links to usable data: a newer download is used, any other complained of. Years are numbers.
       2022a.1.0  2022b      2023c.1.0  nothing       2023c.1.0  2022b_2023c.1.0
       999z.1.0   system     2023c.1.0  nothing       2023c.1.0  999z.1.0_2023c.1.0
       2022a.1.0  2023c.1.0  2023c.1.0  download      2023c.1.0  kept
@@ -31,7 +31,7 @@ TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to
       2022b.1.0  2022b      none       links         system     kept
     # Then a download newer than those links is used, even if it is older than the system's data.
       2024b.1.0  2022b      2023c.1.0  links         2023c.1.0  2024b.1.0_2023c.1.0
-    # Links to data of another schema, and a download with one, are complained of.
+    # What is of another schema is complained of and not used, be it in use or a new download.
       2022a.1.0  2022unfit  2026unfit  both          system     kept
   )";
   std::istringstream rows(std::regex_replace(table, std::regex("#.*"), ""));
@@ -85,9 +85,9 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       + ~/TZVersionDiffRecord = 2022a.1.0_2023c.1.0
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-    # A malformed zoneinfo is reset, and the ICU link is removed.
+    # A zoneinfo that is relative, lacks an element or ends in a slash is reset; the ICU link goes.
       ~/icutz -> ~/tz/2022b/icutz
-      ~/zoneinfo -> {tz/2022b/%n, ~/tz/2022b, ~/tz//zoneinfo, /usr/share/zoneinfo.default/}
+      ~/zoneinfo -> {tz/%n/zoneinfo, ~/tz/2022b, ~/tz//zoneinfo, /usr/share/zoneinfo.default/}
       | Bad zoneinfo link *
       | Invalid current symlinks; resetting to system partition
       - ~/icutz
@@ -103,12 +103,12 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | orv_dataset::create_components: bad path *
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A zoneinfo to data whose version has a number above 2147483647 is reset.
+    # A zoneinfo to data that fit, but with a number above 2147483647 in their version, is reset.
       ~/zoneinfo -> ~/tz/{2147483648a, 2022b.2147483648, 2022b.1.18446744073709551617}/zoneinfo
       ~/tz/*/icutz/icutz44l.dat = data
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # With a file at tz_latest no data can be located.
+    # A file at tz_latest makes the links be reset. Here they are the system's already, and stay.
       ~/tz_latest = data
       | read_symlink: ~/tz_latest
       | Unable to locate data; resetting to system partition
@@ -129,19 +129,19 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/zoneinfo -> ~/tz/2022b/zoneinfo
       | Cannot parse version string unknown.1.0, results.size() = 0
       | Cannot parse version string unknown.1.0
-    # A download with a schema is not used if the system has none.
-      no /usr/share/icu/icutzformat.txt
+    # A pipe as icutzformat.txt is no schema: a download with a schema is not used.
+      /usr/share/icu/icutzformat.txt|
       ~/tz_latest -> ~/tz/2026a
       ~/tz/2026a/icutz/icutz{44b, 44e, 9l}.dat = data
       | New update not compatible or older version: 2026a vs. 2022a.1.0
-    # A download without a schema is used if the system has none. Pipes are not waited for.
-      /usr/share/icu/icutzformat.txt|
+    # A download without a schema is used if the system has none. The record is a pipe and stays.
+      no /usr/share/icu/icutzformat.txt
       ~/TZVersionDiffRecord|
       ~/tz_latest -> ~/tz/2026a
       | No ICU schema found for ~/tz/2026a
       + ~/icutz -> ~/tz/2026a/icutz
       + ~/zoneinfo -> ~/tz/2026a/zoneinfo
-    # A download is not used if its data file has another name or place.
+    # A download is not used if its data file is named or placed otherwise than icutz/icutz44l.dat.
       ~/tz_latest -> ~/tz/2026a
       ~/tz/2026a/icutz/{xicutz44l.dat, icutz44l.dat2, icutz44l-dat, below/icutz44l.dat} = data
       | No ICU schema found for ~/tz/2026a
@@ -180,7 +180,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       /var/db/icu -> /missing
       - /var/db/icu
       - /var/db/icutz
-    # /var/db/icutz goes even if it cannot move, as a dangling ~/icutz is in the way.
+    # /var/db/icutz is removed even if a dangling ~/icutz, which stays, keeps it from moving there.
       ~/icutz -> /missing
       /var/db/icutz -> /usr
       | create_symlink: from ~/icutz to /usr
@@ -208,7 +208,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | read_symlink: ~/localtime
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
-    # A localtime that begins with /usr/share/zoneinfo then leads to ~/zoneinfo, the rest being kept.
+    # A localtime that begins with /usr/share/zoneinfo then leads to ~/zoneinfo, its rest kept.
       ~/localtime -> /usr/share/{zoneinfo/Europe/../Europe/Paris, zoneinfo}
       | Correcting localtime link to ~/*
       + ~/localtime -> ~/*
