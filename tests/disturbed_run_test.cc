@@ -24,8 +24,8 @@ devices left_by_power_cuts(const std::string& device) {
   return left;
 }
 
-// What a device holds when one call of its run fails, which is got over, or that one and all after
-// it, as on a file system that has become read-only.
+// What a device holds when one call of its run fails, which must not fail the run, or that one and
+// all after it, as on a file system that has become read-only.
 devices left_by_failing_calls(const std::string& device) {
   constexpr int more_than_a_run_makes = 25;
   devices left;

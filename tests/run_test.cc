@@ -18,26 +18,26 @@ void expect(const std::string& device, const std::string& said, const std::strin
   EXPECT_EQ(told + listing(), wanted) << "on the device\n" << device;
 }
 
-// A row is a device: its system's version, what its links lead to, its newest download. Then which
-// of these two is complained of, what is in use, the record. What is "unfit" has another schema.
+// A row: the system's version, what the links lead to, the newest download; then which of these two
+// is complained of, what is in use, the record. What is "unfit" has another schema.
 TEST(a_start, uses_a_download_that_fits_and_is_newer_than_what_the_links_lead_to) {
   //  system     links to   download   complains of  in use     record
   const std::string table = R"(
-    # Links to usable data: a newer download is used, any other complained of. Years are numbers.
+    # Links to usable data: a newer download (2023 is above 999) is used, any other complained of.
       2022a.1.0  2022b      2023c.1.0  nothing       2023c.1.0  2022b_2023c.1.0
       999z.1.0   system     2023c.1.0  nothing       2023c.1.0  999z.1.0_2023c.1.0
       2022a.1.0  2023c.1.0  2023c.1.0  download      2023c.1.0  kept
-    # Links to older data than the system's are complained of; 2022b is older than 2022b.1.0.
+    # Links to older data than the system's are reset; 2022b is older than 2022b.1.0.
       2022b.1.0  2022b      none       links         system     kept
-    # Then a download newer than those links is used, even if it is older than the system's data.
+    # Then a download newer than what they led to is used, even if older than the system's data.
       2024b.1.0  2022b      2023c.1.0  links         2023c.1.0  2024b.1.0_2023c.1.0
-    # What is of another schema is complained of and not used, be it in use or a new download.
+    # Data of another schema are complained of and not used, be they linked to or a newer download.
       2022a.1.0  2022unfit  2026unfit  both          system     kept
   )";
   std::istringstream rows(std::regex_replace(table, std::regex("#.*"), ""));
   std::string system, current, latest, complaint, used, record;
   while (rows >> system >> current >> latest >> complaint >> used >> record) {
-    std::string device = usual + links_to(current) + "/usr/share/zoneinfo.default/+VERSION = ";
+    std::string device = usual + links_to(current) + "/usr/share/version = ";
     device += system.substr(0, system.find('.')) + "\n";
     if (latest != "none") device += "~/tz_latest -> ~/tz/" + latest + "\n";
     const std::string of_links = "| Symlink points at data incompatible with installed system\n";
@@ -74,7 +74,7 @@ void expect_stories(const std::string& stories) {
 }
 
 // The usual device uses the system's data, 2022a.1.0; its downloads 2022b and 2023c.1.0 fit. It has
-// no tz_latest, and no ~/icutz: one that is there changes only with zoneinfo. %n is plain text.
+// no tz_latest and no ~/icutz. A version that does not parse makes two lines. %n is plain text.
 TEST(a_start, changes_what_its_story_says_and_nothing_else) {
   expect_stories(R"(
     # A missing zoneinfo is reset, then a download is used.
@@ -85,19 +85,19 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       + ~/TZVersionDiffRecord = 2022a.1.0_2023c.1.0
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-    # A zoneinfo that is relative, lacks an element or ends in a slash is reset; the ICU link goes.
+    # A zoneinfo not spelled ~/tz/VERSION/ANY or as the system's is reset; the ICU link is removed.
       ~/icutz -> ~/tz/2022b/icutz
       ~/zoneinfo -> {tz/%n/zoneinfo, ~/tz/2022b, ~/tz//zoneinfo, /usr/share/zoneinfo.default/}
       | Bad zoneinfo link *
       | Invalid current symlinks; resetting to system partition
       - ~/icutz
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A file at zoneinfo is replaced by the link.
+    # A file at zoneinfo is replaced by the link to the system's data.
       ~/zoneinfo = data
       | read_symlink: ~/zoneinfo
       | Invalid current symlinks; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # If tz_latest is not spelled ~/tz/VERSION, even a zoneinfo to usable data is reset.
+    # If tz_latest is not ~/tz/ and a name after it, even a zoneinfo to usable data is reset.
       ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
       ~/tz_latest -> {tz/2023c.1.0, ~/tz/, ~/tzdata/%n, /var//db/timezone/tz/2023c.1.0}
       | orv_dataset::create_components: bad path *
@@ -108,10 +108,6 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/tz/*/icutz/icutz44l.dat = data
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A file at tz_latest makes the links be reset. Here they are the system's already, and stay.
-      ~/tz_latest = data
-      | read_symlink: ~/tz_latest
-      | Unable to locate data; resetting to system partition
     # A zoneinfo to a release whose name does not parse, as 2023c.1.0/, is reset.
       ~/zoneinfo -> ~/tz/2023c.1.0//
       | Cannot parse version string 2023c.1.0/, results.size() = 0
@@ -119,22 +115,22 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Symlink points at data incompatible with installed system
       + ~/zoneinfo -> /usr/share/zoneinfo.default
     # A download whose name is no version is not used, though its data fit.
-      ~/tz_latest -> ~/tz/{2026, 2026A, 2026a., 2026a.1.2.3, 2026a/, %n2026a}
+      ~/tz_latest -> ~/tz/{a, 2026, 2026A, 2026a., 2026a-1, 2026a.1.2.3, 2026a/, %n2026a}
       ~/tz/*/icutz/icutz44l.dat = data
       | Cannot parse version string *, results.size() = 0
       | Cannot parse version string *
       | New update not compatible or older version: * vs. 2022a.1.0
-    # A system version that does not parse is older than all: a download in use stays.
-      /usr/share/version = unknown
+    # A system version that is empty or does not parse is older than all: a download in use stays.
+      /usr/share/version = {unknown, }
       ~/zoneinfo -> ~/tz/2022b/zoneinfo
-      | Cannot parse version string unknown.1.0, results.size() = 0
-      | Cannot parse version string unknown.1.0
+      | Cannot parse version string *.1.0, results.size() = 0
+      | Cannot parse version string *.1.0
     # A pipe as icutzformat.txt is no schema: a download with a schema is not used.
       /usr/share/icu/icutzformat.txt|
       ~/tz_latest -> ~/tz/2026a
       ~/tz/2026a/icutz/icutz{44b, 44e, 9l}.dat = data
       | New update not compatible or older version: 2026a vs. 2022a.1.0
-    # A download without a schema is used if the system has none. The record is a pipe and stays.
+    # A download without a schema is used if the system has none. A record that is a pipe stays.
       no /usr/share/icu/icutzformat.txt
       ~/TZVersionDiffRecord|
       ~/tz_latest -> ~/tz/2026a
@@ -151,7 +147,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/tz/2026a/icutz/{icutz44l.dat/, icutz44l.dat -> /bin/sh, icutz44l.dat = secret}
       | No ICU schema found for ~/tz/2026a
       | New update not compatible or older version: 2026a vs. 2022a.1.0
-    # An activation silently replaces a file at ~/icutz, and removes a dangling /var/db/icutz.
+    # When a download is taken, a file at ~/icutz is replaced, and a dangling /var/db/icutz goes.
       /var/db/icutz -> /missing
       ~/icutz = data
       ~/tz_latest -> ~/tz/2023c.1.0
@@ -159,7 +155,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       + ~/TZVersionDiffRecord = 2022a.1.0_2023c.1.0
       + ~/icutz -> ~/tz/2023c.1.0/icutz
       + ~/zoneinfo -> ~/tz/2023c.1.0/zoneinfo
-    # Past a directory at ~/icutz no download can be activated, and nothing changes.
+    # A directory at ~/icutz makes an activation fail; the links are reset, to the same as before.
       ~/icutz/
       ~/tz_latest -> ~/tz/2023c.1.0
       | remove: could not remove ~/icutz
@@ -168,7 +164,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | Unable to locate data; resetting to system partition
       | remove: could not remove ~/icutz
       | unlink of ICU softlink failed
-    # /var/db/icutz moves to ~/icutz, its text kept. Then /var/db/icu, to which it led, is removed.
+    # /var/db/icutz moves to ~/icutz, its text kept even if it then dangles. /var/db/icu goes.
       /var/db/icu/
       /var/db/icutz -> icu
       - /var/db/icu
@@ -186,15 +182,16 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       | create_symlink: from ~/icutz to /usr
       | Could not migrate /var/db/icutz to ~/icutz
       - /var/db/icutz
-    # A directory at /var/db/icutz stays. So does, silently, a non-empty one at /var/db/icu.
-      /var/db/icu/below/
+    # A directory at /var/db/icutz stays. So does a non-empty one at /var/db/icu, without a word.
       /var/db/icutz/
+      /var/db/icu/below/
       | read_symlink: /var/db/icutz
       | Could not migrate /var/db/icutz to ~/icutz
       | remove: could not remove /var/db/icutz
       | Could not remove /var/db/icutz
-    # A missing localtime becomes Los Angeles.
+    # A missing localtime becomes Los Angeles, even if there never was a download.
       no ~/localtime
+      no ~/tz
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
     # A localtime that begins with ~/zoneinfo silently stays.
@@ -203,16 +200,16 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/localtime -> {~/zoneinf, zoneinfo/, /var//db/timezone/zoneinfo, ../../../usr/share/zoneinfo}
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
-    # A file or a directory at localtime is replaced by the link to Los Angeles.
+    # A file or an empty directory at localtime is replaced by the link to Los Angeles.
       ~/{localtime = data, localtime/}
       | read_symlink: ~/localtime
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
-    # A localtime that begins with /usr/share/zoneinfo then leads to ~/zoneinfo, its rest kept.
+    # A localtime that begins with /usr/share/zoneinfo gets ~/zoneinfo instead, its rest kept.
       ~/localtime -> /usr/share/{zoneinfo/Europe/../Europe/Paris, zoneinfo}
       | Correcting localtime link to ~/*
       + ~/localtime -> ~/*
-    # If there is nothing under ~ (which has no zoneinfo.default), localtime becomes Los Angeles.
+    # A localtime that begins with /usr/share/zoneinfo becomes Los Angeles if ~ lacks the place.
       /usr/share/zoneinfo.default/UTC -> /missing
       ~/localtime -> /usr/share/{zoneinfo/UTC, zoneinfo/+VERSION/a, zoneinfo.default/Europe/Paris}
       | Correcting localtime link to ~/*
@@ -221,12 +218,14 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
   )");
 }
 
-TEST(a_start, fails_where_the_store_is_a_pipe) {
-  build(usual + "~|");
+TEST(a_start, fails_at_directories_in_the_place_of_links_but_keeps_them) {
+  build(usual + "~/zoneinfo/\n no ~/localtime\n ~/localtime/below/\n ~/icutz -> /usr\n" +
+        "~/tz_latest = data");
+  const std::string before = listing();
   const std::string told = start();
-  EXPECT_TRUE(told.starts_with(
-      "| read_symlink: ~/tz_latest\n| Unable to locate data; resetting to system partition\n"));
+  EXPECT_TRUE(told.starts_with("| read_symlink: ~/tz_latest\n| Unable to locate data;")) << told;
   EXPECT_TRUE(told.ends_with("| Could not reset localtime link\n| status 1\n")) << told;
+  EXPECT_EQ(listing(), before);
 }
 
 TEST(a_start, cuts_the_target_of_a_link_after_1024_bytes) {
@@ -258,6 +257,7 @@ TEST(a_start, goes_on_where_what_it_writes_is_lost) {
     ::setrlimit(RLIMIT_FSIZE, &no_bytes);  // The record raises SIGXFSZ.
   };
   EXPECT_EQ(start(prepare), "");
+  EXPECT_EQ(content("/var/db/timezone/TZVersionDiffRecord"), "");  // Emptied, so it came to that.
 }
 
 TEST(first_word, lies_between_white_space_of_any_kind) {
@@ -284,7 +284,7 @@ TEST(versions, are_ordered_by_the_first_field_that_differs) {
       EXPECT_EQ(left == right, &left == &right);
     }
   }
-  const std::string many(100000, 'z');
+  const std::string many(100000, 'z');  // So many must not overflow the stack.
   EXPECT_EQ(tz_version("02016" + many + ".010"), tz_version("2016" + many + ".10"));
 }
 
