@@ -198,7 +198,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
     # A localtime that begins with ~/zoneinfo silently stays.
       ~/localtime -> {~/zoneinfo, ~/zoneinfoX/No/Zone}
     # A localtime that begins with neither ~/zoneinfo nor /usr/share/zoneinfo becomes Los Angeles.
-      ~/localtime -> {~/zoneinf, zoneinfo/, /mnt/var/db/timezone/zoneinfo, /var//db/timezone/zoneinfo}
+      ~/localtime -> {~/zoneinf, zoneinfo, /x/var/db/timezone/zoneinfo, /var//db/timezone/zoneinfo}
       | localtime link invalid; resetting to America/Los_Angeles
       + ~/localtime -> ~/zoneinfo/America/Los_Angeles
     # A file or an empty directory at localtime is replaced by the link to Los Angeles.
