@@ -77,7 +77,7 @@ void expect_stories(const std::string& stories) {
 // no tz_latest and no ~/icutz. A version that does not parse makes two lines. %n is plain text.
 TEST(a_start, changes_what_its_story_says_and_nothing_else) {
   expect_stories(R"(
-    # A missing zoneinfo is reset, then a download is used.
+    # A missing zoneinfo is reset, and in the same start a download is used.
       no ~/zoneinfo
       ~/tz_latest -> ~/tz/2023c.1.0
       | Bad zoneinfo link
@@ -108,7 +108,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/tz/*/icutz/icutz44l.dat = data
       | Unable to locate data; resetting to system partition
       + ~/zoneinfo -> /usr/share/zoneinfo.default
-    # A zoneinfo to a release whose name does not parse, as 2023c.1.0/, is reset.
+    # A zoneinfo to a release whose name does not parse, here 2023c.1.0/, is reset.
       ~/zoneinfo -> ~/tz/2023c.1.0//
       | Cannot parse version string 2023c.1.0/, results.size() = 0
       | Cannot parse version string 2023c.1.0/
@@ -125,10 +125,10 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       ~/zoneinfo -> ~/tz/2022b/zoneinfo
       | Cannot parse version string *.1.0, results.size() = 0
       | Cannot parse version string *.1.0
-    # A pipe as icutzformat.txt is no schema: a download with a schema is not used.
+    # A pipe as icutzformat.txt is no schema: a download with any schema is not used.
       /usr/share/icu/icutzformat.txt|
       ~/tz_latest -> ~/tz/2026a
-      ~/tz/2026a/icutz/icutz{44b, 44e, 9l}.dat = data
+      ~/tz/2026a/icutz/icutz{44l, 44b, 44e, 9l}.dat = data
       | New update not compatible or older version: 2026a vs. 2022a.1.0
     # A download without a schema is used if the system has none. A record that is a pipe stays.
       no /usr/share/icu/icutzformat.txt
@@ -171,7 +171,7 @@ TEST(a_start, changes_what_its_story_says_and_nothing_else) {
       - /var/db/icu
       - /var/db/icutz
       + ~/icutz -> icu
-    # If ~/icutz leads to something, a file at /var/db/icutz goes. A link at /var/db/icu goes.
+    # If ~/icutz leads to something, a file at /var/db/icutz goes. A dangling /var/db/icu goes too.
       ~/icutz -> /usr
       /var/db/icutz = data
       /var/db/icu -> /missing
