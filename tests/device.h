@@ -24,7 +24,7 @@ struct throw_away_root : testing::Environment {
   void SetUp() override {
     ASSERT_TRUE(::chroot(KELVANE_ROOT) == 0 && ::chdir("/") == 0)
         << "be root, or start this by: unshare --map-root-user";
-    ::umask(022);  // Data that others may not read do not count.
+    ::umask(062);  // Data count if others may read them; the group need not.
     fs::create_directories("/locale/xx");
     ::mkfifo("/locale/xx/LC_IDENTIFICATION", 0600);
   }
